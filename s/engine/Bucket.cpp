@@ -1,0 +1,61 @@
+// The making and the end of a bucket.
+// Test: tests/bucket_test.cpp.
+#include "engine/Bucket.h"
+
+#include <atomic>
+#include <cassert>
+#include <new>
+
+namespace VOK::MemPool {
+
+Bucket* Bucket::Create(Group* parent, std::uint32_t bucketSize, std::uint16_t dataSize) {
+  assert(dataSize + 2 * recHeaderSize <= bucketSize && bucketSize <= maxBucketSize);
+  const std::uint32_t stride = dataSize + recHeaderSize;
+  const std::uint32_t size = 2 + (bucketSize - 2) / stride * stride;
+  auto* const b = static_cast<Bucket*>(::operator new[](recsBaseOffset + size));
+  b->parent = parent;
+  b->next1 = b->prev1 = b->next2 = b->prev2 = nullptr;
+  b->recsSize = static_cast<std::uint16_t>(size);
+  b->recSize = static_cast<std::uint16_t>(stride);
+  b->Carve();
+  return b;
+}
+
+// Chains all records in ascending order, so that the first request gets the lowest one.
+void Bucket::Carve() {
+  const std::uint32_t stride = recSize;
+  const std::uint32_t last = recsSize - stride;
+  freeHead = 2;
+  freeRecs = static_cast<std::uint16_t>(TotalRecs());
+  std::uint8_t* const base = RecsBase();
+  const auto carve = [base](std::uint32_t offset, std::uint32_t next) {
+    Rec* const rec = reinterpret_cast<Rec*>(base + offset);
+    rec->SetOffset(static_cast<std::uint16_t>(next));
+    rec->type = RecType::Free;
+  };
+  for (std::uint32_t offset = 2; offset < last; offset += stride)
+    carve(offset, offset + stride);
+  carve(last, 0);
+}
+
+Bucket* Bucket::FromData(const void* p) {
+  if (p == nullptr) return nullptr;
+  const Rec* const rec = Rec::FromData(p);
+  if (rec->type != RecType::Used || rec->Offset() < 2) return nullptr;
+  Bucket* const bucket = OfUsed(rec);
+  if (bucket == nullptr || bucket->parent == nullptr || bucket->recsSize == 0) return nullptr;
+  return bucket;
+}
+
+void Bucket::Destroy(Bucket* b) noexcept {
+  if (b == nullptr || b->recSize == 0) return;
+  b->parent = nullptr;
+  b->next1 = b->prev1 = b->next2 = b->prev2 = nullptr;
+  b->recsSize = 0;
+  b->recSize = 0;
+  // The compiler may drop stores to a block that goes back next.
+  std::atomic_signal_fence(std::memory_order_seq_cst);
+  ::operator delete[](b);
+}
+
+} // namespace VOK::MemPool

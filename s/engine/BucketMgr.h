@@ -1,0 +1,94 @@
+// One pool: its snapshot of the settings, its table of size classes, its list of ExtRecs. The
+// operations of a request stand in Road.h, which sees all that they meet.
+// Test: tests/bucketmgr_test.cpp.
+#ifndef VOK_MEMPOOL_BUCKETMGR_H
+#define VOK_MEMPOOL_BUCKETMGR_H
+
+#include "engine/SizeClasses.h"
+
+#include <cstdint>
+#include <string>
+
+namespace VOK::MemPool {
+
+struct Bucket;
+struct ExtRec;
+struct Group;
+class Mgr;
+
+/// Sizes named `...RecSize` are whole records: the data and the 4 bytes of the header.
+///
+/// In a pool that serves:
+/// - minRecSize <= maxRecSize, both multiples of dataAlignment, maxRecSize + 4 <= bucketSize
+/// - numGroups == (maxRecSize - minRecSize) / dataAlignment + 1
+/// - groups[i], where it is set, is owned by this pool and has RecSizeIndex(dataSize) == i
+/// - numExtRecs is the length of the list at extRecs
+/// - with `enabled` false every entry and extRecs are null
+///
+/// It opens with what names the pool, and closes with what the road of a request reads beside the
+/// table: the two switches, and the rule that needs exactly the bytes they leave.
+struct BucketMgr {
+  std::string name;            ///< the pool's name, also its key in the registry
+  Mgr* mgr;                    ///< the public handle; the engine doesn't read it
+  Group** groups;              ///< one entry a size class, null until its first request
+  ExtRec* extRecs;             ///< head of the list of ExtRecs, null when there is none
+  std::uint32_t numGroups;     ///< length of `groups`
+  std::uint32_t numExtRecs;    ///< length of the list of ExtRecs
+  std::uint32_t bucketSize;    ///< the most bytes of a bucket's record area
+  std::uint32_t dataAlignment; ///< the multiple to which sizes are rounded, never 0
+  std::uint32_t maxRecSize;    ///< largest record that a bucket serves
+  std::uint32_t minRecSize;    ///< record size at index 0, to which smaller records are lifted
+  bool keepEmptyBuckets;       ///< an emptied bucket stays
+  bool enabled;                ///< the pool pools; false: every request goes to the heap
+  IndexRule indexRule;         ///< derived from the sizes: the short way to an index
+
+  /// Takes the snapshot and makes the table. Ends the process if the settings make a pool
+  /// impossible; throws what `operator new[]` throws.
+  BucketMgr(Mgr* mgr, const std::string& name);
+
+  /// Releases everything, used or not.
+  ~BucketMgr();
+
+  BucketMgr(const BucketMgr&) = delete;
+  BucketMgr& operator=(const BucketMgr&) = delete;
+
+  /// A block of at least `size` bytes, never null; the heap's exception passes through.
+  /// REQUIRES: `size` <= maxRequest.
+  void* Alloc(std::uint32_t size);
+
+  /// Takes back `p`; false, with nothing changed, if it isn't recognised as this pool's.
+  bool Free(void* p);
+
+  /// Releases all records and size classes; the table, the name and the snapshot stay.
+  void Clear() noexcept;
+
+  /// The capacity of a record, the requested size of an ExtRec, 0 for anything else.
+  std::uint32_t GetSize(const void* p) const;
+
+  /// Whether `p` is a used record of this pool, or an ExtRec of any.
+  bool Contains(const void* p) const;
+
+  /// The bucket of `p` if it is this pool's, else null. With `enabled` false it is null without a
+  /// look in front of `p`, where the bytes are the heap's and can read as anything.
+  Bucket* FindBucket(const void* p) const;
+
+  /// The number of buckets in all size classes.
+  std::uint32_t GetNumBuckets() const;
+
+private:
+  void* AllocTraced(std::uint32_t size);
+  void* AllocByRule(std::uint32_t size);
+  void* AllocExtRec(std::uint32_t size);
+  bool FreeTraced(void* p);
+  bool FreeByRule(void* p);
+  bool FreeExtRec(ExtRec* e);
+};
+
+// The leading string's size is the standard library's; behind it nothing is padded between fields.
+static_assert(sizeof(BucketMgr) - sizeof(std::string) >= 3 * sizeof(void*) + 6 * 4 + 4);
+static_assert(sizeof(void*) != 4 || sizeof(std::string) != 24 || sizeof(BucketMgr) == 64);
+static_assert(sizeof(void*) != 8 || sizeof(std::string) != 32 || sizeof(BucketMgr) == 88);
+
+} // namespace VOK::MemPool
+
+#endif

@@ -1,0 +1,88 @@
+// The making and releasing of buckets and the two lists: what stands beside the road of a request.
+// Test: tests/group_test.cpp.
+#include "engine/Group.h"
+
+#include <cassert>
+
+namespace VOK::MemPool {
+
+Group::Group(BucketMgr* owner_, std::uint16_t dataSize_)
+    : owner(owner_), dataSize(dataSize_),
+      totalRecs(
+          static_cast<std::uint16_t>((owner_->bucketSize - 2) / (dataSize_ + recHeaderSize))) {}
+
+VOK_COLD void* Group::AllocFromNewBucket() {
+  Bucket* const b = Bucket::Create(this, owner->bucketSize, dataSize);
+  assert(b->freeRecs == totalRecs);
+  ++numBuckets;
+  b->next1 = head1;
+  if (head1 != nullptr) head1->prev1 = b;
+  head1 = b;
+  if (tail1 == nullptr) tail1 = b;
+  LinkFree(b);
+  return Alloc();
+}
+
+VOK_COLD void* Group::UnlinkFull(Bucket* b, void* p) {
+  UnlinkFree(b);
+  return p;
+}
+
+VOK_COLD bool Group::LinkRefilled(Bucket* b) {
+  LinkFree(b);
+  return true;
+}
+
+VOK_COLD bool Group::ReleaseEmptied(Bucket* b) {
+  const bool wasFull = b->freeRecs == 1; // then it stands on the first list alone
+  if (owner->keepEmptyBuckets) {
+    if (wasFull) LinkFree(b);
+    return true;
+  }
+  UnlinkAll(b);
+  if (!wasFull) UnlinkFree(b);
+  Bucket::Destroy(b);
+  return true;
+}
+
+bool Group::Free(void* p, Bucket* bucket) {
+  if (bucket == nullptr) bucket = Bucket::FromData(p);
+  if (bucket == nullptr || bucket->parent != this) return false;
+  if (p == nullptr || Rec::FromData(p) == nullptr) return false;
+  return TakeBack(p, bucket);
+}
+
+void Group::Clear() noexcept {
+  for (Bucket* b = head1; b != nullptr;) {
+    Bucket* const next = b->next1;
+    Bucket::Destroy(b);
+    b = next;
+  }
+  head1 = head2 = nullptr;
+  numBuckets = numFreeBuckets = 0;
+}
+
+void Group::LinkFree(Bucket* b) {
+  ++numFreeBuckets;
+  b->next2 = head2;
+  if (head2 != nullptr) head2->prev2 = b;
+  head2 = b;
+}
+
+void Group::UnlinkFree(Bucket* b) {
+  --numFreeBuckets;
+  Bucket* const prev = b->prev2;
+  Bucket* const next = b->next2;
+  (prev != nullptr ? prev->next2 : head2) = next;
+  if (next != nullptr) next->prev2 = prev;
+}
+
+void Group::UnlinkAll(Bucket* b) {
+  --numBuckets;
+  Bucket* const prev = b->prev1;
+  Bucket* const next = b->next1;
+  (prev != nullptr ? prev->next1 : head1) = next;
+  (next != nullptr ? next->prev1 : tail1) = prev;
+}
+
+} // namespace VOK::MemPool

@@ -1,0 +1,17 @@
+// The attributes that keep the road of a request straight: what every request runs is inlined
+// into one piece, what few requests run stands out of line and is reached by a tail call.
+// Test: scripts/check-road.
+#ifndef VOK_MEMPOOL_HOTCOLD_H
+#define VOK_MEMPOOL_HOTCOLD_H
+
+#define VOK_HOT inline __attribute__((always_inline))
+#define VOK_COLD __attribute__((noinline))
+
+// An extern variable is reached through the global offset table unless it is known to be ours.
+#ifdef _WIN32
+#define VOK_HIDDEN
+#else
+#define VOK_HIDDEN __attribute__((visibility("hidden")))
+#endif
+
+#endif

@@ -1,0 +1,105 @@
+// Each walk restates the equations that stand above the struct, and no more.
+// Test: tests/model_test.cpp.
+#include "engine/Invariants.h"
+
+#include "engine/Bucket.h"
+#include "engine/BucketMgr.h"
+#include "engine/ExtRec.h"
+#include "engine/Group.h"
+
+#include <cstdint>
+
+namespace VOK::MemPool {
+
+namespace {
+
+const Rec* RecAt(const Bucket& bucket, std::uint32_t offset) {
+  const auto* const base = reinterpret_cast<const std::uint8_t*>(&bucket) + recsBaseOffset;
+  return reinterpret_cast<const Rec*>(base + offset);
+}
+
+bool IsRecordOf(const Bucket& bucket, std::uint32_t offset) {
+  return offset >= 2 && offset < bucket.recsSize && (offset - 2) % bucket.recSize == 0;
+}
+
+// The chain ends after freeRecs records, so a circle fails too.
+bool FreeListIsValid(const Bucket& bucket) {
+  std::uint32_t offset = bucket.freeHead;
+  for (std::uint32_t i = 0; i < bucket.freeRecs; ++i) {
+    if (!IsRecordOf(bucket, offset)) return false;
+    const Rec* const rec = RecAt(bucket, offset);
+    if (rec->type != RecType::Free) return false;
+    offset = rec->Offset();
+  }
+  return offset == 0;
+}
+
+bool UsedRecsAreValid(const Bucket& bucket) {
+  std::uint32_t used = 0;
+  for (std::uint32_t offset = 2; offset < bucket.recsSize; offset += bucket.recSize) {
+    const Rec* const rec = RecAt(bucket, offset);
+    if (rec->type == RecType::Free) continue;
+    if (rec->type != RecType::Used || rec->Offset() != offset) return false;
+    ++used;
+  }
+  return used == bucket.TotalRecs() - bucket.freeRecs;
+}
+
+bool ExtRecsAreValid(const BucketMgr& pool) {
+  std::uint32_t count = 0;
+  const ExtRec* prev = nullptr;
+  for (const ExtRec* e = pool.extRecs; e != nullptr; prev = e, e = e->next) {
+    if (e->prev != prev || e->tag0 != 0xAA || e->tag1 != 0xBB || e->type != RecType::Ext ||
+        e->tag3 != 0xCC || ++count > pool.numExtRecs)
+      return false;
+  }
+  return count == pool.numExtRecs;
+}
+
+} // namespace
+
+bool IsValid(const Bucket& bucket) {
+  if (bucket.recSize == 0) return false;
+  const std::uint32_t totalRecs = bucket.TotalRecs();
+  return totalRecs >= 1 && 2 + totalRecs * bucket.recSize == bucket.recsSize &&
+         (bucket.freeHead == 0) == (bucket.freeRecs == 0) && FreeListIsValid(bucket) &&
+         UsedRecsAreValid(bucket);
+}
+
+bool IsValid(const Group& group) {
+  std::uint32_t withFree = 0;
+  std::uint32_t count = 0;
+  const Bucket* prev = nullptr;
+  for (const Bucket* b = group.head1; b != nullptr; prev = b, b = b->next1) {
+    if (b->prev1 != prev || b->parent != &group || ++count > group.numBuckets) return false;
+    if (b->recSize != group.dataSize + recHeaderSize || b->TotalRecs() != group.totalRecs ||
+        b->recsSize > group.owner->bucketSize || !IsValid(*b))
+      return false;
+    if (b->freeRecs == group.totalRecs && !group.owner->keepEmptyBuckets) return false;
+    if (b->freeRecs > 0) ++withFree;
+  }
+  if (count != group.numBuckets || prev != group.tail1) return false;
+
+  count = 0;
+  prev = nullptr;
+  for (const Bucket* b = group.head2; b != nullptr; prev = b, b = b->next2)
+    if (b->prev2 != prev || b->freeRecs == 0 || ++count > group.numFreeBuckets) return false;
+  return count == group.numFreeBuckets && count == withFree;
+}
+
+bool IsValid(const BucketMgr& pool) {
+  if (pool.minRecSize > pool.maxRecSize || pool.maxRecSize + recHeaderSize > pool.bucketSize ||
+      pool.minRecSize % pool.dataAlignment != 0 || pool.maxRecSize % pool.dataAlignment != 0 ||
+      pool.numGroups != (pool.maxRecSize - pool.minRecSize) / pool.dataAlignment + 1)
+    return false;
+  for (std::uint32_t i = 0; i < pool.numGroups; ++i) {
+    const Group* const group = pool.groups[i];
+    if (group == nullptr) continue;
+    if (!pool.enabled || group->owner != &pool ||
+        RecSizeIndex(group->dataSize, pool.minRecSize, pool.dataAlignment) != i || !IsValid(*group))
+      return false;
+  }
+  return ExtRecsAreValid(pool) && (pool.enabled || pool.extRecs == nullptr);
+}
+
+} // namespace VOK::MemPool

@@ -1,0 +1,79 @@
+// The public handle: a pool's life, its name, and the one limit on a request's size.
+// Test: tests/registry_test.cpp, tests/process_test.cpp.
+#include "MemPool"
+
+#include "engine/BucketMgr.h"
+#include "engine/Invariants.h"
+#include "engine/Road.h"
+#include "services/Messages.h"
+#include "services/MgrRegistry.h"
+
+#include <memory>
+#include <string>
+
+namespace VOK::MemPool {
+
+namespace {
+
+[[noreturn]] VOK_COLD void StopTooLarge(unsigned size) {
+  Messages::Error({"Cannot allocate ", size, " bytes, ", "the maximum is ", maxRequest});
+}
+
+} // namespace
+
+Mgr::Mgr() : Mgr(nullptr) {}
+
+Mgr::Mgr(const char* name) : bucketMgr(nullptr) {
+  const std::string text = name != nullptr ? name : MgrRegistry::NextAutomaticName();
+  if (MgrRegistry::Find(text) != nullptr)
+    Messages::Error({"Duplicate Vok_MemPool::Mgr name encountered '", text.c_str(), "'"});
+  auto pool = std::make_unique<BucketMgr>(this, text);
+  MgrRegistry::Enter(text, pool.get());
+  bucketMgr = pool.release();
+}
+
+Mgr::~Mgr() {
+  if (bucketMgr == nullptr) return;
+  MgrRegistry::Remove(bucketMgr->name);
+  delete bucketMgr;
+  bucketMgr = nullptr;
+}
+
+// Private, so that no caller copies a handle.
+Mgr::Mgr(const Mgr&) {}
+
+Mgr& Mgr::operator=(const Mgr& other) {
+  bucketMgr = other.bucketMgr;
+  return *this;
+}
+
+void* Mgr::Alloc(unsigned size) {
+  if (size > maxRequest) [[unlikely]]
+    StopTooLarge(size);
+  const Checked checked(bucketMgr);
+  return bucketMgr->Alloc(size);
+}
+
+bool Mgr::Free(void* p) {
+  const Checked checked(bucketMgr);
+  return bucketMgr->Free(p);
+}
+
+void Mgr::Clear() {
+  const Checked checked(bucketMgr);
+  bucketMgr->Clear();
+}
+
+unsigned Mgr::GetSize(const void* p) const { return bucketMgr->GetSize(p); }
+
+bool Mgr::Contains(const void* p) const { return bucketMgr->Contains(p); }
+
+bool Mgr::CollectGarbage() { return false; }
+
+BucketMgr* Mgr::GetBucketMgr() const { return bucketMgr; }
+
+const char* Mgr::GetName() const { return bucketMgr->name.c_str(); }
+
+bool Mgr::IsEnabled() const { return bucketMgr->enabled; }
+
+} // namespace VOK::MemPool

@@ -1,0 +1,61 @@
+// A record's header: 4 bytes in front of the data that the caller holds. In a free record they
+// chain the free list, in a used one they lead back to the bucket. A record has no alignment
+// beyond what its size gives it, so the header is read and written one byte at a time.
+// Test: tests/bucket_test.cpp.
+#ifndef VOK_MEMPOOL_REC_H
+#define VOK_MEMPOOL_REC_H
+
+#include "engine/HotCold.h"
+#include "engine/SizeClasses.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+
+namespace VOK::MemPool {
+
+/// What byte 2 of a header says. `Ext` is the type of an ExtRec, whose header ends in the same
+/// shape.
+enum RecType : std::uint8_t { Free = 0, Used = 1, Ext = 2 };
+
+/// ```
+///     0          1           2      3         4
+///     +----------+-----------+------+---------+------------
+///     | offset, low and high | type | as it   | data ...
+///     | byte                 |      | was     |
+///     +----------+-----------+------+---------+------------
+/// ```
+struct Rec {
+  std::uint8_t offsetLow;  ///< low byte of the next free record's offset, or of this one's own
+  std::uint8_t offsetHigh; ///< high byte of the same
+  std::uint8_t type;       ///< a RecType: says which of the two offsets the header holds
+  std::uint8_t unused;     ///< stays as the heap delivered it
+
+  static VOK_HOT Rec* FromData(void* p) {
+    return reinterpret_cast<Rec*>(static_cast<std::uint8_t*>(p) - sizeof(Rec));
+  }
+  static VOK_HOT const Rec* FromData(const void* p) {
+    return reinterpret_cast<const Rec*>(static_cast<const std::uint8_t*>(p) - sizeof(Rec));
+  }
+
+  VOK_HOT void* Data() { return this + 1; }
+
+  /// The one pair that touches the 16-bit number. Both compile to one access, the writer only in
+  /// this form: left as two stores, g++ keeps them apart in Bucket::PushRec.
+  VOK_HOT std::uint16_t Offset() const {
+    return static_cast<std::uint16_t>(offsetLow | offsetHigh << 8);
+  }
+  VOK_HOT void SetOffset(std::uint16_t offset) {
+    const std::uint8_t bytes[] = {static_cast<std::uint8_t>(offset),
+                                  static_cast<std::uint8_t>(offset >> 8)};
+    std::memcpy(this, bytes, sizeof bytes);
+  }
+};
+
+static_assert(offsetof(Rec, offsetLow) == 0 && offsetof(Rec, offsetHigh) == 1);
+static_assert(offsetof(Rec, type) == 2 && offsetof(Rec, unused) == 3);
+static_assert(sizeof(Rec) == recHeaderSize && alignof(Rec) == 1);
+
+} // namespace VOK::MemPool
+
+#endif

@@ -1,0 +1,32 @@
+// The library's start and end: all its load-time objects, in their order, in the one unit that has
+// an initialiser. A client runs behind them, since a library is initialised before its users;
+// nothing else secures that the registry and the settings stand before the first Mgr.
+// Test: tests/process_test.cpp, scripts/check-library.
+#include "services/MgrRegistry.h"
+#include "services/Output.h"
+#include "services/Settings.h"
+
+#include <iostream>
+
+namespace VOK::MemPool {
+
+namespace {
+
+struct RegistryLife {
+  RegistryLife() { MgrRegistry::Begin(); }
+  ~RegistryLife() { MgrRegistry::End(); }
+};
+
+struct SettingsLife {
+  SettingsLife() { Settings::Load(); }
+};
+
+const RegistryLife registryLife;
+const SettingsLife settingsLife;
+
+} // namespace
+
+std::ostream& StandardOutput() { return std::cout; }
+std::ostream& StandardError() { return std::cerr; }
+
+} // namespace VOK::MemPool

@@ -1,0 +1,73 @@
+// The map's life, the automatic names, and the exported ways to find pools.
+// Test: tests/registry_test.cpp.
+#include "services/MgrRegistry.h"
+
+#include "MemPool"
+#include "engine/BucketMgr.h"
+
+#include <cstdint>
+#include <new>
+
+namespace VOK::MemPool {
+
+namespace MgrRegistry {
+
+namespace {
+
+// The map's storage without its life: it begins by Begin and is never destroyed.
+union Storage {
+  Map map;
+  constexpr Storage() : unused() {}
+  ~Storage() {}
+  char unused;
+};
+
+constinit Storage registry;
+
+std::uint32_t nextMgrId = 1;
+
+} // namespace
+
+void Begin() { new (&registry.map) Map; }
+
+void End() noexcept { registry.map.clear(); }
+
+const Map& Entries() { return registry.map; }
+
+BucketMgr* Find(std::string_view name) {
+  const auto entry = registry.map.find(name);
+  return entry != registry.map.end() ? entry->second : nullptr;
+}
+
+void Enter(const std::string& name, BucketMgr* pool) { registry.map.emplace(name, pool); }
+
+void Remove(const std::string& name) noexcept { registry.map.erase(name); }
+
+std::string NextAutomaticName() {
+  const std::string number = std::to_string(nextMgrId++);
+  const std::size_t width = 5;
+  return "__VOK_MEMPOOL_" + std::string(width - std::min(width, number.size()), '0') + number;
+}
+
+} // namespace MgrRegistry
+
+Mgr* GetMgr(const char* name) {
+  BucketMgr* const pool = MgrRegistry::Find(name != nullptr ? name : "");
+  return pool != nullptr ? pool->mgr : nullptr;
+}
+
+void GetMgrs(vector<Mgr*>& mgrs) {
+  mgrs.Reserve(GetNumMgrs());
+  for (const auto& [name, pool] : MgrRegistry::Entries())
+    mgrs.Append(pool->mgr);
+}
+
+void GetMgrs(std::vector<Mgr*>& mgrs) {
+  mgrs.reserve(GetNumMgrs());
+  for (const auto& [name, pool] : MgrRegistry::Entries())
+    mgrs.push_back(pool->mgr);
+}
+
+unsigned GetNumMgrs() { return static_cast<unsigned>(MgrRegistry::Entries().size()); }
+
+} // namespace VOK::MemPool

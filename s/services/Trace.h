@@ -1,0 +1,38 @@
+// The trace lines of all pools: the test of the switch, inline for the road of a request, and the
+// four lines beside it. A line takes nothing from the heap, so that what Free and Alloc have done
+// can't fail any more in telling it.
+// Test: tests/trace_test.cpp.
+#ifndef VOK_MEMPOOL_TRACE_H
+#define VOK_MEMPOOL_TRACE_H
+
+#include "engine/HotCold.h"
+#include "services/Settings.h"
+
+#include <cstdint>
+
+namespace VOK::MemPool {
+
+struct BucketMgr;
+
+/// The text of a pointer as the platform's stream writes it in the classic locale, without a
+/// leading "0x".
+struct BarePtrText {
+  char text[2 * sizeof(void*) + 1];
+
+  explicit BarePtrText(const void* p);
+};
+
+namespace Trace {
+
+VOK_HOT bool IsOn() { return Settings::trace; }
+
+void Constructed(const BucketMgr* pool);
+void Destroyed(const BucketMgr* pool);
+void Allocated(const BucketMgr* pool, const void* p, std::uint32_t size);
+void Freed(const BucketMgr* pool, const void* p);
+
+} // namespace Trace
+
+} // namespace VOK::MemPool
+
+#endif
