@@ -27,9 +27,8 @@ void Bucket::Carve() {
   const std::uint32_t last = recsSize - stride;
   freeHead = 2;
   freeRecs = static_cast<std::uint16_t>(TotalRecs());
-  std::uint8_t* const base = RecsBase();
-  const auto carve = [base](std::uint32_t offset, std::uint32_t next) {
-    Rec* const rec = reinterpret_cast<Rec*>(base + offset);
+  const auto carve = [this](std::uint32_t offset, std::uint32_t next) {
+    Rec* const rec = RecAt(offset);
     rec->SetOffset(static_cast<std::uint16_t>(next));
     rec->type = RecType::Free;
   };

@@ -4,15 +4,18 @@
 #ifndef VOK_MEMPOOL_BUCKET_H
 #define VOK_MEMPOOL_BUCKET_H
 
+#include "MemPool"
 #include "engine/HotCold.h"
 #include "engine/Rec.h"
 
 #include <cstddef>
 #include <cstdint>
+#include <iosfwd>
 
 namespace VOK::MemPool {
 
 struct Group;
+struct SizeFreqMap;
 
 /// Offsets with 4-byte and with 8-byte pointers:
 /// ```
@@ -83,14 +86,47 @@ struct Bucket {
   /// REQUIRES: `p` is a used record of this bucket.
   void PushRec(void* p);
 
-  /// How many records the bucket has; stored nowhere, so it costs a division.
-  std::uint32_t TotalRecs() const { return (recsSize - 2u) / recSize; }
+  /// How many records the bucket has; stored nowhere, so it costs a division. A damaged header that
+  /// gives no number counts as none.
+  std::uint32_t TotalRecs() const {
+    return recSize == 0 || recsSize < 2 ? 0 : (recsSize - 2u) / recSize;
+  }
 
   VOK_HOT std::uint8_t* RecsBase() { return reinterpret_cast<std::uint8_t*>(&freeRecs); }
-  VOK_HOT Rec* RecAt(std::uint16_t offset) { return reinterpret_cast<Rec*>(RecsBase() + offset); }
+  VOK_HOT Rec* RecAt(std::uint32_t offset) { return reinterpret_cast<Rec*>(RecsBase() + offset); }
+
+  const std::uint8_t* RecsBase() const { return reinterpret_cast<const std::uint8_t*>(&freeRecs); }
+  const Rec* RecAt(std::uint32_t offset) const {
+    return reinterpret_cast<const Rec*>(RecsBase() + offset);
+  }
+  std::uint16_t OffsetOf(const Rec* rec) const {
+    return static_cast<std::uint16_t>(reinterpret_cast<const std::uint8_t*>(rec) - RecsBase());
+  }
+
+  /// Adds the used records of this bucket to `sizes`.
+  void CollectUsedSizes(SizeFreqMap& sizes) const;
+
+  /// The report of this bucket, under the number `bucketNum`, with its titles at `depth`.
+  void Dbg(std::ostream& os, std::uint32_t bucketNum, std::uint32_t depth, bool showRecs,
+           bool showFreeList) const;
 
 private:
+  using Recs = vector<const Rec*>;
+
   void Carve();
+
+  void DbgHistogram(std::ostream& os, std::uint32_t depth) const;
+  void DbgRecs(std::ostream& os, std::uint32_t depth) const;
+  void DbgMap(std::ostream& os) const;
+  void DbgMapRule(std::ostream& os, std::uint16_t cells) const;
+  void DbgMapTypes(std::ostream& os, std::uint16_t cells, std::uint16_t first,
+                   const Recs& recs) const;
+  void DbgMapOffsets(std::ostream& os, std::uint16_t cells, std::uint16_t first,
+                     const Recs& recs) const;
+  void DbgMapSizes(std::ostream& os, std::uint16_t cells, std::uint16_t first) const;
+  void DbgMapData(std::ostream& os, std::uint16_t cells, std::uint16_t first,
+                  const Recs& recs) const;
+  void DbgFreeList(std::ostream& os, std::uint32_t depth) const;
 };
 
 /// The distance from a bucket to the point from which its offsets count.

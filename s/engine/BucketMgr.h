@@ -7,6 +7,7 @@
 #include "engine/SizeClasses.h"
 
 #include <cstdint>
+#include <iosfwd>
 #include <string>
 
 namespace VOK::MemPool {
@@ -14,6 +15,7 @@ namespace VOK::MemPool {
 struct Bucket;
 struct ExtRec;
 struct Group;
+struct SizeFreqMap;
 class Mgr;
 
 /// Sizes named `...RecSize` are whole records: the data and the 4 bytes of the header.
@@ -75,6 +77,11 @@ struct BucketMgr {
   /// The number of buckets in all size classes.
   std::uint32_t GetNumBuckets() const;
 
+  /// The report of this pool with its first line at `depth`. `detailed` adds a report of each
+  /// bucket, in which `showRecs` and `showFreeList` choose the sections.
+  void Dbg(std::ostream& os, std::uint32_t depth, bool detailed, bool showRecs,
+           bool showFreeList) const;
+
 private:
   void* AllocTraced(std::uint32_t size);
   void* AllocByRule(std::uint32_t size);
@@ -82,6 +89,12 @@ private:
   bool FreeTraced(void* p);
   bool FreeByRule(void* p);
   bool FreeExtRec(ExtRec* e);
+
+  void DbgHistogram(std::ostream& os, std::uint32_t depth, const SizeFreqMap& sizes) const;
+  void DbgBuckets(std::ostream& os, std::uint32_t depth) const;
+  void DbgFreeBuckets(std::ostream& os, std::uint32_t depth, std::uint32_t freeBucks,
+                      std::uint32_t freeBucksM) const;
+  void DbgExtRecs(std::ostream& os, std::uint32_t depth) const;
 };
 
 // The leading string's size is the standard library's; behind it nothing is padded between fields.

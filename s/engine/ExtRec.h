@@ -59,6 +59,7 @@ struct ExtRec {
   void Scrub();
 
   void* Data() { return this + 1; }
+  const void* Data() const { return this + 1; }
 };
 
 static_assert(offsetof(ExtRec, next) == 0);

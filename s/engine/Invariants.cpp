@@ -13,11 +13,6 @@ namespace VOK::MemPool {
 
 namespace {
 
-const Rec* RecAt(const Bucket& bucket, std::uint32_t offset) {
-  const auto* const base = reinterpret_cast<const std::uint8_t*>(&bucket) + recsBaseOffset;
-  return reinterpret_cast<const Rec*>(base + offset);
-}
-
 bool IsRecordOf(const Bucket& bucket, std::uint32_t offset) {
   return offset >= 2 && offset < bucket.recsSize && (offset - 2) % bucket.recSize == 0;
 }
@@ -27,7 +22,7 @@ bool FreeListIsValid(const Bucket& bucket) {
   std::uint32_t offset = bucket.freeHead;
   for (std::uint32_t i = 0; i < bucket.freeRecs; ++i) {
     if (!IsRecordOf(bucket, offset)) return false;
-    const Rec* const rec = RecAt(bucket, offset);
+    const Rec* const rec = bucket.RecAt(offset);
     if (rec->type != RecType::Free) return false;
     offset = rec->Offset();
   }
@@ -37,7 +32,7 @@ bool FreeListIsValid(const Bucket& bucket) {
 bool UsedRecsAreValid(const Bucket& bucket) {
   std::uint32_t used = 0;
   for (std::uint32_t offset = 2; offset < bucket.recsSize; offset += bucket.recSize) {
-    const Rec* const rec = RecAt(bucket, offset);
+    const Rec* const rec = bucket.RecAt(offset);
     if (rec->type == RecType::Free) continue;
     if (rec->type != RecType::Used || rec->Offset() != offset) return false;
     ++used;

@@ -1,0 +1,41 @@
+// The table of a bucket's free list, by its links: the order in which the records will be handed
+// out. The chain lies in the records, and a damaged one can run in a circle, so the walk is bound.
+// Test: tests/report_test.cpp.
+#include "diagnostics/ReportText.h"
+#include "engine/Bucket.h"
+#include "services/Messages.h"
+
+#include <cstdint>
+
+namespace VOK::MemPool {
+
+namespace {
+
+constexpr Column columns[] = {{"Id", 5},   {"Offset", 6},   {"Next", 5},
+                              {"Size", 5}, {"Address", 18}, {"Next Addr", 18}};
+
+/// Whether a record's header at `offset` lies within the bucket. Offset 0 ends the chain and never
+/// does.
+bool HoldsHeader(const Bucket& bucket, std::uint32_t offset) {
+  return offset >= 2 && offset + recHeaderSize <= bucket.recsSize;
+}
+
+} // namespace
+
+void Bucket::DbgFreeList(std::ostream& os, std::uint32_t depth) const {
+  Table table(os, depth, columns);
+  const std::uint32_t totalRecs = TotalRecs();
+  std::uint32_t count = 0;
+  for (std::uint32_t offset = freeHead; HoldsHeader(*this, offset); ++count) {
+    const std::uint32_t next = RecAt(offset)->Offset();
+    table.Row().Id(count + 1).Cell(offset).Cell(next).Cell(recSize).Cell(PtrText(RecAt(offset)));
+    table.Cell(PtrText(next != 0 ? RecAt(next) : nullptr)).End();
+    if (count > totalRecs) {
+      Messages::Warning({"Exceeded the number of total number of recs ", count, " > ", totalRecs});
+      return;
+    }
+    offset = next;
+  }
+}
+
+} // namespace VOK::MemPool

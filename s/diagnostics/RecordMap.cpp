@@ -1,0 +1,124 @@
+// The map of a bucket: a grid of boxes, one a record in address order, that shows at a glance what
+// is in use, where the free list starts and where each free record points next.
+// Test: tests/report_test.cpp.
+#include "MemPool"
+
+#include "diagnostics/Records.h"
+#include "engine/Bucket.h"
+
+#include <algorithm>
+#include <cstdint>
+#include <iomanip>
+#include <ostream>
+#include <string>
+
+namespace VOK::MemPool {
+
+namespace {
+
+/// The margin of every line but the heading and the size line.
+std::ostream& Margin(std::ostream& os) { return os << std::setw(5) << " "; }
+
+/// A value that fills its box from the left, with the wall behind it.
+template <class Value>
+void Box(std::ostream& os, int width, const Value& value) {
+  os << std::left << std::setw(width) << value << std::right << "| ";
+}
+
+/// What a box says beside its wall: a tag of two characters and a number.
+template <class Number>
+void TaggedBox(std::ostream& os, const char* tag, Number number) {
+  os << tag;
+  Box(os, 6, number);
+}
+
+void Heading(std::ostream& os, std::uint32_t numbers) {
+  os << std::setw(6) << " ";
+  for (std::uint32_t i = 1; i <= numbers; ++i)
+    os << "    " << i << "     ";
+  os << std::endl;
+}
+
+} // namespace
+
+void Bucket::DbgMap(std::ostream& os) const {
+  constexpr std::uint16_t boxes = 8; // in a full row
+  const std::uint32_t totalRecs = TotalRecs();
+  Recs recs;
+  recs.Reserve(totalRecs);
+  ForEachRecord(*this, [&](std::uint32_t offset) { recs.Append(RecAt(offset)); });
+
+  const auto row = [&](std::uint16_t cells, std::uint16_t first) {
+    DbgMapTypes(os, cells, first, recs);
+    DbgMapOffsets(os, cells, first, recs);
+    DbgMapSizes(os, cells, first);
+    DbgMapData(os, cells, first, recs);
+  };
+  const auto width = static_cast<std::uint16_t>(std::min<std::uint32_t>(recs.count, boxes));
+  const auto rest = static_cast<std::uint16_t>(totalRecs % boxes);
+  const auto full = static_cast<std::uint16_t>(totalRecs - rest);
+
+  Heading(os, width);
+  for (std::uint16_t first = 0; first < full; first = static_cast<std::uint16_t>(first + boxes)) {
+    DbgMapRule(os, boxes);
+    row(boxes, first);
+  }
+  DbgMapRule(os, width);
+  if (rest == 0) return;
+  row(rest, full);
+  DbgMapRule(os, rest);
+}
+
+void Bucket::DbgMapRule(std::ostream& os, std::uint16_t cells) const {
+  Margin(os) << "+";
+  for (std::uint16_t i = 0; i < cells; ++i)
+    os << "---------+";
+  os << std::endl;
+}
+
+void Bucket::DbgMapTypes(std::ostream& os, std::uint16_t cells, std::uint16_t first,
+                         const Recs& recs) const {
+  Margin(os) << "| ";
+  for (std::uint32_t i = first; i < first + cells; ++i) {
+    const std::uint32_t offset = OffsetOf(recs[i]);
+    const std::string label = TypeLabel(TypeAt(*this, offset));
+    Box(os, 8, offset == freeHead ? label + " +" : label);
+  }
+  os << std::endl;
+}
+
+void Bucket::DbgMapOffsets(std::ostream& os, std::uint16_t cells, std::uint16_t first,
+                           const Recs& recs) const {
+  Margin(os) << "| ";
+  for (std::uint32_t i = first; i < first + cells; ++i)
+    TaggedBox(os, "o=", OffsetOf(recs[i]));
+  os << std::endl;
+}
+
+void Bucket::DbgMapSizes(std::ostream& os, std::uint16_t cells, std::uint16_t first) const {
+  os << std::setw(4) << first << " | ";
+  for (std::uint16_t i = 0; i < cells; ++i)
+    TaggedBox(os, "s=", recSize);
+  os << std::endl;
+}
+
+void Bucket::DbgMapData(std::ostream& os, std::uint16_t cells, std::uint16_t first,
+                        const Recs& recs) const {
+  Margin(os) << "| ";
+  for (std::uint32_t i = first; i < first + cells; ++i) {
+    switch (TypeAt(*this, OffsetOf(recs[i]))) {
+    case RecType::Free:
+      TaggedBox(os, "n=", recs[i]->Offset());
+      break;
+    case RecType::Used:
+      TaggedBox(os, "d=", recSize - recHeaderSize);
+      break;
+    default:
+      TaggedBox(os, "u=", 0);
+      break;
+    }
+  }
+  os << std::endl;
+}
+
+} // namespace VOK::MemPool

@@ -1,0 +1,52 @@
+// How a report reads the records of a bucket: by address, whatever the header says of them, and no
+// byte at or behind the end of the record area, so that a damaged header leads nowhere else.
+// Test: tests/report_test.cpp.
+#ifndef VOK_MEMPOOL_RECORDS_H
+#define VOK_MEMPOOL_RECORDS_H
+
+#include "engine/Bucket.h"
+#include "engine/Rec.h"
+
+#include <cstddef>
+#include <cstdint>
+
+namespace VOK::MemPool {
+
+/// The type byte of a record that has none within the area.
+inline constexpr std::uint8_t noType = 255;
+
+/// The type byte of the record at `offset`, read anew.
+inline std::uint8_t TypeAt(const Bucket& bucket, std::uint32_t offset) {
+  return offset + offsetof(Rec, type) < bucket.recsSize ? bucket.RecAt(offset)->type : noType;
+}
+
+/// A type byte's name in all reports.
+inline const char* TypeLabel(std::uint8_t type) {
+  switch (type) {
+  case RecType::Free:
+    return "FREE";
+  case RecType::Used:
+    return "USED";
+  case RecType::Ext:
+    return "EXT";
+  default:
+    return "UNKN";
+  }
+}
+
+/// Calls `visit` with the offset of each record in address order, that of a piece at the end of a
+/// damaged area too. The first record is visited before any look at the end; a header whose sizes
+/// lead to no record at all gives none.
+template <class Visit>
+void ForEachRecord(const Bucket& bucket, Visit visit) {
+  if (bucket.recSize == 0 || bucket.recsSize < 2) return;
+  std::uint32_t offset = 2;
+  do {
+    visit(offset);
+    offset += bucket.recSize;
+  } while (offset < bucket.recsSize);
+}
+
+} // namespace VOK::MemPool
+
+#endif

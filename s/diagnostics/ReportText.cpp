@@ -1,0 +1,83 @@
+// The primitives of all reports.
+// Test: tests/report_test.cpp.
+#include "diagnostics/ReportText.h"
+
+#include <locale>
+#include <sstream>
+
+namespace VOK::MemPool {
+
+std::string Indent(std::uint32_t depth) { return std::string(std::size_t{3} * depth, ' '); }
+
+std::string PtrText(const void* p) {
+  std::ostringstream text;
+  text.imbue(std::locale::classic());
+  text.width(8);
+  text << std::hex << p;
+  return text.str();
+}
+
+void HeaderText(std::ostream& os, const std::string& indent, const char* label,
+                const std::string& text) {
+  os << indent << label << text << std::endl;
+}
+
+void ZeroFilled(std::ostream& os, int width, std::uint32_t number) {
+  os.fill('0');
+  os.width(width);
+  os << number;
+  os.fill(' ');
+}
+
+Table::Table(std::ostream& os_, std::uint32_t depth, std::span<const Column> columns_)
+    : os(os_), indent(Indent(depth)), columns(columns_) {
+  os << std::left;
+  Row();
+  for (const Column& column : columns)
+    Cell(column.title);
+  End();
+
+  os << std::right;
+  os.fill('=');
+  Row();
+  for (std::size_t i = 0; i < columns.size(); ++i)
+    Cell("=");
+  End();
+  os.fill(' ');
+}
+
+Table& Table::Row() {
+  next = 0;
+  os << indent;
+  return *this;
+}
+
+Table& Table::Id(std::uint32_t number) {
+  ZeroFilled(os, NextWidth(), number);
+  return Text(" ");
+}
+
+Table& Table::Percent(double number) {
+  os.width(NextWidth() - 1);
+  os << std::fixed;
+  os.precision(3);
+  os << number;
+  return Text("% ");
+}
+
+Table& Table::Bar(std::uint32_t stars) {
+  os.width(static_cast<std::streamsize>(stars));
+  os.fill('*');
+  os << "*";
+  os.fill(' ');
+  return *this;
+}
+
+Table& Table::Text(const char* text) {
+  os << text;
+  return *this;
+}
+
+void Table::End() { os << std::endl; }
+
+} // namespace VOK::MemPool
