@@ -1,6 +1,7 @@
 // The report of one bucket: its header block, and the sections that show its records. It reads the
 // bucket as it finds it and mends nothing.
 // Test: tests/report_test.cpp.
+#include "diagnostics/ReportLayout.h"
 #include "diagnostics/ReportText.h"
 #include "engine/Bucket.h"
 
@@ -13,7 +14,7 @@ namespace {
 
 /// A title's beginning: what names the bucket.
 std::ostream& Mark(std::ostream& os, const std::string& indent, std::uint32_t bucketNum) {
-  os << indent << "MemPool::Bucket #";
+  os << indent << BucketTitle::bucket;
   ZeroFilled(os, 3, bucketNum);
   return os;
 }
@@ -34,36 +35,36 @@ void Bucket::Dbg(std::ostream& os, std::uint32_t bucketNum, std::uint32_t depth,
 
   os << std::endl;
   Mark(os, titleIndent, bucketNum) << std::endl;
-  HeaderText(os, indent, "Addr        : ", PtrText(this));
-  HeaderNumber(os, indent, "Sizeof      : ", sizeof(Bucket));
-  HeaderText(os, indent, "Parent      : ", PtrText(parent));
-  HeaderText(os, indent, "Next1       : ", PtrText(next1));
-  HeaderText(os, indent, "Prev1       : ", PtrText(prev1));
-  HeaderText(os, indent, "Next2       : ", PtrText(next2));
-  HeaderText(os, indent, "Prev2       : ", PtrText(prev2));
-  HeaderText(os, indent, "Recs Base   : ", PtrText(RecsBase()));
-  HeaderText(os, indent, "Recs Beg    : ", PtrText(RecAt(2)));
-  HeaderText(os, indent, "Recs End    : ", PtrText(RecAt(recsSize)));
-  HeaderNumber(os, indent, "Recs Size   : ", recSize);
-  HeaderNumber(os, indent, "Size        : ", recsSize);
-  HeaderNumber(os, indent, "Total Recs  : ", totalRecs);
-  HeaderNumber(os, indent, "Used Recs   : ", usedRecs);
-  HeaderNumber(os, indent, "Used Bytes  : ", dataSize * usedRecs);
-  HeaderNumber(os, indent, "Free Recs   : ", freeRecs);
-  HeaderNumber(os, indent, "Free Bytes  : ", dataSize * freeRecs);
-  HeaderNumber(os, indent, "Free Head   : ", freeHead);
-  HeaderNumber(os, indent, "Hdr Offset  : ", sizeof(Bucket));
+  HeaderText(os, indent, BucketLabel::addr, PtrText(this));
+  HeaderNumber(os, indent, BucketLabel::sizeofBucket, sizeof(Bucket));
+  HeaderText(os, indent, BucketLabel::parent, PtrText(parent));
+  HeaderText(os, indent, BucketLabel::next1, PtrText(next1));
+  HeaderText(os, indent, BucketLabel::prev1, PtrText(prev1));
+  HeaderText(os, indent, BucketLabel::next2, PtrText(next2));
+  HeaderText(os, indent, BucketLabel::prev2, PtrText(prev2));
+  HeaderText(os, indent, BucketLabel::recsBase, PtrText(RecsBase()));
+  HeaderText(os, indent, BucketLabel::recsBeg, PtrText(RecAt(2)));
+  HeaderText(os, indent, BucketLabel::recsEnd, PtrText(RecAt(recsSize)));
+  HeaderNumber(os, indent, BucketLabel::recSize, recSize);
+  HeaderNumber(os, indent, BucketLabel::recsSize, recsSize);
+  HeaderNumber(os, indent, BucketLabel::totalRecs, totalRecs);
+  HeaderNumber(os, indent, BucketLabel::usedRecs, usedRecs);
+  HeaderNumber(os, indent, BucketLabel::usedBytes, dataSize * usedRecs);
+  HeaderNumber(os, indent, BucketLabel::freeRecs, freeRecs);
+  HeaderNumber(os, indent, BucketLabel::freeBytes, dataSize * freeRecs);
+  HeaderNumber(os, indent, BucketLabel::freeHead, freeHead);
+  HeaderNumber(os, indent, BucketLabel::headerOffset, sizeof(Bucket));
 
   if (showRecs) {
-    title(" ALL RECORDS (", totalRecs);
+    title(BucketTitle::records, totalRecs);
     DbgRecs(os, depth + 1);
-    title(" USED DATA FREQ DIST HISTOGRAM (", usedRecs);
+    title(BucketTitle::histogram, usedRecs);
     DbgHistogram(os, depth + 1);
-    title(" ALL RECORDS MAP (", totalRecs);
+    title(BucketTitle::map, totalRecs);
     DbgMap(os);
   }
   if (showFreeList) {
-    title(" FREE LIST (", freeRecs);
+    title(BucketTitle::freeList, freeRecs);
     DbgFreeList(os, depth + 1);
   }
   os << std::endl;

@@ -1,6 +1,7 @@
 // The table of a bucket's free list, by its links: the order in which the records will be handed
 // out. The chain lies in the records, and a damaged one can run in a circle, so the walk is bound.
 // Test: tests/report_test.cpp.
+#include "diagnostics/ReportLayout.h"
 #include "diagnostics/ReportText.h"
 #include "engine/Bucket.h"
 #include "services/Messages.h"
@@ -11,9 +12,6 @@ namespace VOK::MemPool {
 
 namespace {
 
-constexpr Column columns[] = {{"Id", 5},   {"Offset", 6},   {"Next", 5},
-                              {"Size", 5}, {"Address", 18}, {"Next Addr", 18}};
-
 /// Whether a record's header at `offset` lies within the bucket. Offset 0 ends the chain and never
 /// does.
 bool HoldsHeader(const Bucket& bucket, std::uint32_t offset) {
@@ -23,7 +21,7 @@ bool HoldsHeader(const Bucket& bucket, std::uint32_t offset) {
 } // namespace
 
 void Bucket::DbgFreeList(std::ostream& os, std::uint32_t depth) const {
-  Table table(os, depth, columns);
+  Table table(os, depth, BucketColumns::freeList);
   const std::uint32_t totalRecs = TotalRecs();
   std::uint32_t count = 0;
   for (std::uint32_t offset = freeHead; HoldsHeader(*this, offset); ++count) {

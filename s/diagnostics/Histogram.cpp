@@ -2,6 +2,7 @@
 // whose bars are scaled to the most frequent size, and the one of a bucket, one star a record.
 // Test: tests/report_test.cpp.
 #include "diagnostics/Records.h"
+#include "diagnostics/ReportLayout.h"
 #include "diagnostics/ReportText.h"
 #include "diagnostics/SizeFreqMap.h"
 #include "engine/Bucket.h"
@@ -15,11 +16,10 @@ namespace VOK::MemPool {
 
 namespace {
 
-/// The columns that a bar is meant for.
+/// The stars that a bar is meant to have at most: the width of its column.
 constexpr std::uint32_t barWidth = 50;
-
-constexpr Column poolColumns[] = {{"Id", 5}, {"Size", 7}, {"Freq", 9}, {"Magnitude", barWidth}};
-constexpr Column bucketColumns[] = {{"Id", 5}, {"Size", 5}, {"Freq", 5}, {"Magnitude", barWidth}};
+static_assert(PoolColumns::histogram[3].width == barWidth);
+static_assert(BucketColumns::histogram[3].width == barWidth);
 
 std::uint32_t Scale(const SizeFreqMap& sizes) {
   std::uint32_t peak = 0;
@@ -42,9 +42,8 @@ void Bucket::CollectUsedSizes(SizeFreqMap& sizes) const {
 void BucketMgr::DbgHistogram(std::ostream& os, std::uint32_t depth,
                              const SizeFreqMap& sizes) const {
   os << std::endl;
-  os << Indent(depth + 1) << "USED DATA FREQ DIST HISTOGRAM (" << sizes.frequencies.size() << ")"
-     << std::endl;
-  Table table(os, depth, poolColumns);
+  os << Indent(depth + 1) << PoolTitle::histogram << sizes.frequencies.size() << ")" << std::endl;
+  Table table(os, depth, PoolColumns::histogram);
   const std::uint32_t scale = Scale(sizes);
   std::uint32_t id = 0;
   for (const auto& [size, frequency] : sizes.frequencies)
@@ -54,7 +53,7 @@ void BucketMgr::DbgHistogram(std::ostream& os, std::uint32_t depth,
 void Bucket::DbgHistogram(std::ostream& os, std::uint32_t depth) const {
   SizeFreqMap sizes;
   CollectUsedSizes(sizes);
-  Table table(os, depth, bucketColumns);
+  Table table(os, depth, BucketColumns::histogram);
   std::uint32_t id = 0;
   for (const auto& [size, frequency] : sizes.frequencies) {
     table.Row().Id(++id).Cell(size).Cell(frequency).Bar(std::min(frequency, barWidth));

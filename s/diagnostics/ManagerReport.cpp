@@ -3,6 +3,7 @@
 // Test: tests/report_test.cpp.
 #include "MemPool"
 
+#include "diagnostics/ReportLayout.h"
 #include "diagnostics/ReportText.h"
 #include "diagnostics/SizeFreqMap.h"
 #include "engine/Bucket.h"
@@ -57,32 +58,32 @@ struct Figures {
 
 void WriteHeader(std::ostream& os, std::uint32_t depth, const BucketMgr& pool,
                  const Figures& figures) {
-  os << Indent(depth) << "MemPool::Mgr " << pool.name << std::endl;
+  os << Indent(depth) << PoolTitle::pool << pool.name << std::endl;
   const std::string indent = Indent(depth + 1);
-  HeaderText(os, indent, "Version     : ", GetVersion());
-  HeaderText(os, indent, "Addr        : ", PtrText(&pool));
-  HeaderNumber(os, indent, "Sizeof      : ", sizeof(BucketMgr));
-  HeaderNumber(os, indent, "Bucket Size : ", pool.bucketSize);
-  HeaderNumber(os, indent, "Num Groups  : ", pool.numGroups);
-  HeaderNumber(os, indent, "Num Buckets : ", pool.GetNumBuckets());
-  HeaderNumber(os, indent, "   Empty    : ", figures.emptyBuckets);
-  HeaderNumber(os, indent, "   Full     : ", figures.fullBuckets);
-  HeaderNumber(os, indent, "Used Recs   : ", figures.usedRecs);
-  HeaderNumber(os, indent, "Ext Recs    : ", pool.numExtRecs);
-  HeaderNumber(os, indent, "Free Recs   : ", figures.freeRecs);
-  HeaderNumber(os, indent, "Free Bucks  : ", figures.freeBucks);
-  HeaderNumber(os, indent, "Free BucksM : ", figures.freeBucksM);
-  HeaderNumber(os, indent, "Enabled     : ", pool.enabled);
-  HeaderNumber(os, indent, "Max Ext Sz  : ", maxRequest);
-  HeaderNumber(os, indent, "Min Buck Sz : ", minBucketSize);
-  HeaderNumber(os, indent, "Max Buck Sz : ", maxBucketSize);
-  HeaderNumber(os, indent, "Min Rec Sz  : ", pool.minRecSize);
-  HeaderNumber(os, indent, "Max Rec Sz  : ", pool.maxRecSize);
-  HeaderNumber(os, indent, "Data Align  : ", pool.dataAlignment);
-  HeaderNumber(os, indent, "Sizeof Buck : ", sizeof(Bucket));
-  HeaderNumber(os, indent, "Sizeof Hdr  : ", sizeof(Rec));
-  HeaderNumber(os, indent, "Sizeof Free : ", sizeof(Rec));
-  HeaderNumber(os, indent, "Sizeof Used : ", sizeof(Rec));
+  HeaderText(os, indent, PoolLabel::version, GetVersion());
+  HeaderText(os, indent, PoolLabel::addr, PtrText(&pool));
+  HeaderNumber(os, indent, PoolLabel::sizeofPool, sizeof(BucketMgr));
+  HeaderNumber(os, indent, PoolLabel::bucketSize, pool.bucketSize);
+  HeaderNumber(os, indent, PoolLabel::numGroups, pool.numGroups);
+  HeaderNumber(os, indent, PoolLabel::numBuckets, pool.GetNumBuckets());
+  HeaderNumber(os, indent, PoolLabel::empty, figures.emptyBuckets);
+  HeaderNumber(os, indent, PoolLabel::full, figures.fullBuckets);
+  HeaderNumber(os, indent, PoolLabel::usedRecs, figures.usedRecs);
+  HeaderNumber(os, indent, PoolLabel::extRecs, pool.numExtRecs);
+  HeaderNumber(os, indent, PoolLabel::freeRecs, figures.freeRecs);
+  HeaderNumber(os, indent, PoolLabel::freeBucks, figures.freeBucks);
+  HeaderNumber(os, indent, PoolLabel::freeBucksM, figures.freeBucksM);
+  HeaderNumber(os, indent, PoolLabel::enabled, pool.enabled);
+  HeaderNumber(os, indent, PoolLabel::maxExtSize, maxRequest);
+  HeaderNumber(os, indent, PoolLabel::minBucketSize, minBucketSize);
+  HeaderNumber(os, indent, PoolLabel::maxBucketSize, maxBucketSize);
+  HeaderNumber(os, indent, PoolLabel::minRecSize, pool.minRecSize);
+  HeaderNumber(os, indent, PoolLabel::maxRecSize, pool.maxRecSize);
+  HeaderNumber(os, indent, PoolLabel::dataAlignment, pool.dataAlignment);
+  HeaderNumber(os, indent, PoolLabel::sizeofBucket, sizeof(Bucket));
+  HeaderNumber(os, indent, PoolLabel::sizeofHeader, sizeof(Rec));
+  HeaderNumber(os, indent, PoolLabel::sizeofFree, sizeof(Rec));
+  HeaderNumber(os, indent, PoolLabel::sizeofUsed, sizeof(Rec));
 }
 
 void ReportAll(bool detailed) {

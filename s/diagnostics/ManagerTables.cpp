@@ -1,6 +1,7 @@
 // The three tables of a pool's report: every bucket with its fill, the buckets that can still serve
 // by size class, and the heap blocks beyond the largest record.
 // Test: tests/report_test.cpp.
+#include "diagnostics/ReportLayout.h"
 #include "diagnostics/ReportText.h"
 #include "engine/Bucket.h"
 #include "engine/BucketMgr.h"
@@ -13,15 +14,6 @@
 namespace VOK::MemPool {
 
 namespace {
-
-constexpr Column bucketColumns[] = {{"Id", 5},    {"Group", 5},  {"Used", 5},     {"Free", 5},
-                                    {"Total", 5}, {"% Used", 8}, {"Rec Size", 8}, {"Addr", 8}};
-
-constexpr Column freeBucketColumns[] = {{"Id", 5},    {"Group", 5}, {"Size", 5},
-                                        {"Count", 5}, {"Off", 5},   {"Buckets", 8}};
-
-constexpr Column extRecColumns[] = {{"Id", 5},       {"Length", 7}, {"Data Ptr", 8},
-                                    {"Heap Ptr", 8}, {"Next", 8},   {"Prev", 8}};
 
 double PercentUsed(std::uint32_t usedRecs, std::uint32_t totalRecs) {
   return totalRecs == 0 ? 0.0 : usedRecs * 100.0 / totalRecs;
@@ -38,8 +30,8 @@ std::uint32_t CountFree(const Group& group) {
 
 void BucketMgr::DbgBuckets(std::ostream& os, std::uint32_t depth) const {
   os << std::endl;
-  os << Indent(depth + 1) << "BUCKETS (" << GetNumBuckets() << ")" << std::endl;
-  Table table(os, depth + 2, bucketColumns);
+  os << Indent(depth + 1) << PoolTitle::buckets << GetNumBuckets() << ")" << std::endl;
+  Table table(os, depth + 2, PoolColumns::buckets);
   std::uint32_t id = 0;
   for (std::uint32_t i = 0; i < numGroups; ++i) {
     if (groups[i] == nullptr) continue;
@@ -55,8 +47,9 @@ void BucketMgr::DbgBuckets(std::ostream& os, std::uint32_t depth) const {
 void BucketMgr::DbgFreeBuckets(std::ostream& os, std::uint32_t depth, std::uint32_t freeBucks,
                                std::uint32_t freeBucksM) const {
   os << std::endl;
-  os << Indent(depth + 1) << "FREE BUCKETS (" << freeBucks << "," << freeBucksM << ")" << std::endl;
-  Table table(os, depth + 2, freeBucketColumns);
+  os << Indent(depth + 1) << PoolTitle::freeBuckets << freeBucks << "," << freeBucksM << ")"
+     << std::endl;
+  Table table(os, depth + 2, PoolColumns::freeBuckets);
   std::uint32_t id = 0;
   for (std::uint32_t i = 0; i < numGroups; ++i) {
     if (groups[i] == nullptr || groups[i]->head2 == nullptr) continue;
@@ -72,8 +65,8 @@ void BucketMgr::DbgFreeBuckets(std::ostream& os, std::uint32_t depth, std::uint3
 
 void BucketMgr::DbgExtRecs(std::ostream& os, std::uint32_t depth) const {
   os << std::endl;
-  os << Indent(depth + 1) << "EXT RECS (" << numExtRecs << ")" << std::endl;
-  Table table(os, depth + 2, extRecColumns);
+  os << Indent(depth + 1) << PoolTitle::extRecs << numExtRecs << ")" << std::endl;
+  Table table(os, depth + 2, PoolColumns::extRecs);
   std::uint32_t id = 0;
   for (const ExtRec* e = extRecs; e != nullptr; e = e->next) {
     table.Row().Cell(++id).Cell(e->length).Cell(PtrText(e->Data())).Cell(PtrText(e));

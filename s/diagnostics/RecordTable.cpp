@@ -2,6 +2,7 @@
 // what lies in the bucket even where that list is broken.
 // Test: tests/report_test.cpp.
 #include "diagnostics/Records.h"
+#include "diagnostics/ReportLayout.h"
 #include "diagnostics/ReportText.h"
 #include "engine/Bucket.h"
 #include "services/Messages.h"
@@ -10,16 +11,9 @@
 
 namespace VOK::MemPool {
 
-namespace {
-
-constexpr Column columns[] = {{"Id", 5},  {"Type", 4},  {"Offset", 6},  {"Size", 5},
-                              {"End", 5}, {"DSize", 5}, {"Address", 18}};
-
-} // namespace
-
 void Bucket::DbgRecs(std::ostream& os, std::uint32_t depth) const {
   const std::uint32_t totalRecs = TotalRecs();
-  Table table(os, depth, columns);
+  Table table(os, depth, BucketColumns::records);
   std::uint32_t count = 0;
   ForEachRecord(*this, [&](std::uint32_t offset) {
     const std::uint8_t type = TypeAt(*this, offset);

@@ -4,6 +4,7 @@
 #ifndef VOK_MEMPOOL_RECORDS_H
 #define VOK_MEMPOOL_RECORDS_H
 
+#include "diagnostics/ReportLayout.h"
 #include "engine/Bucket.h"
 #include "engine/Rec.h"
 
@@ -24,13 +25,13 @@ inline std::uint8_t TypeAt(const Bucket& bucket, std::uint32_t offset) {
 inline const char* TypeLabel(std::uint8_t type) {
   switch (type) {
   case RecType::Free:
-    return "FREE";
+    return TypeName::free;
   case RecType::Used:
-    return "USED";
+    return TypeName::used;
   case RecType::Ext:
-    return "EXT";
+    return TypeName::ext;
   default:
-    return "UNKN";
+    return TypeName::unknown;
   }
 }
 

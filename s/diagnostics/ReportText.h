@@ -5,6 +5,8 @@
 #ifndef VOK_MEMPOOL_REPORTTEXT_H
 #define VOK_MEMPOOL_REPORTTEXT_H
 
+#include "diagnostics/ReportLayout.h"
+
 #include <cstddef>
 #include <cstdint>
 #include <ostream>
@@ -34,11 +36,6 @@ void HeaderText(std::ostream& os, const std::string& indent, const char* label,
 
 /// A number filled in front with zeros. The stream's fill is a blank afterwards.
 void ZeroFilled(std::ostream& os, int width, std::uint32_t number);
-
-struct Column {
-  const char* title;
-  int width;
-};
 
 /// A table under its heading. A data row is Row(), one call a cell from left to right, End(); each
 /// cell takes the width of its column, and a longer value is written whole.

@@ -4,8 +4,6 @@
 #ifndef VOK_MEMPOOL_SIZECLASSES_H
 #define VOK_MEMPOOL_SIZECLASSES_H
 
-#include "engine/HotCold.h"
-
 #include <bit>
 #include <cstdint>
 

@@ -5,6 +5,8 @@
 #include "MemPool"
 #include "engine/BucketMgr.h"
 
+#include <algorithm>
+#include <cstddef>
 #include <cstdint>
 #include <new>
 
@@ -15,33 +17,28 @@ namespace MgrRegistry {
 namespace {
 
 // The map's storage without its life: it begins by Begin and is never destroyed.
-union Storage {
-  Map map;
-  constexpr Storage() : unused() {}
-  ~Storage() {}
-  char unused;
-};
+alignas(Map) std::byte storage[sizeof(Map)];
 
-constinit Storage registry;
+Map& Registry() { return *std::launder(reinterpret_cast<Map*>(storage)); }
 
 std::uint32_t nextMgrId = 1;
 
 } // namespace
 
-void Begin() { new (&registry.map) Map; }
+void Begin() { new (storage) Map; }
 
-void End() noexcept { registry.map.clear(); }
+void End() noexcept { Registry().clear(); }
 
-const Map& Entries() { return registry.map; }
+const Map& Entries() { return Registry(); }
 
 BucketMgr* Find(std::string_view name) {
-  const auto entry = registry.map.find(name);
-  return entry != registry.map.end() ? entry->second : nullptr;
+  const auto entry = Registry().find(name);
+  return entry != Registry().end() ? entry->second : nullptr;
 }
 
-void Enter(const std::string& name, BucketMgr* pool) { registry.map.emplace(name, pool); }
+void Enter(const std::string& name, BucketMgr* pool) { Registry().emplace(name, pool); }
 
-void Remove(const std::string& name) noexcept { registry.map.erase(name); }
+void Remove(const std::string& name) noexcept { Registry().erase(name); }
 
 std::string NextAutomaticName() {
   const std::string number = std::to_string(nextMgrId++);

@@ -1,0 +1,42 @@
+# VokMemPoolWarnings: the warnings that our own targets are built with, all of them errors.
+add_library(VokMemPoolWarnings INTERFACE)
+if(CMAKE_CXX_COMPILER_ID MATCHES "Clang")
+  target_compile_options(VokMemPoolWarnings INTERFACE
+    -Werror
+    -Weverything
+    # This is C++20; what C++98 and C++17 lacked is no news.
+    -Wno-c++98-compat
+    -Wno-c++98-compat-pedantic
+    -Wno-c++20-compat
+    -Wno-pre-c++20-compat-pedantic
+    # A layout's gaps are fixed by static_asserts where they matter.
+    -Wno-padded
+    # The registry and the settings start with the library and end with it, by design.
+    -Wno-global-constructors
+    -Wno-exit-time-destructors)
+elseif(CMAKE_CXX_COMPILER_ID STREQUAL "GNU")
+  target_compile_options(VokMemPoolWarnings INTERFACE
+    -Werror
+    -Wall
+    -Wextra
+    -Wpedantic
+    -Wshadow
+    -Wconversion
+    -Wsign-conversion
+    -Wundef
+    -Wold-style-cast
+    -Wcast-qual
+    -Wcast-align
+    -Wnon-virtual-dtor
+    -Woverloaded-virtual
+    -Wduplicated-cond
+    -Wduplicated-branches
+    -Wlogical-op
+    -Wnull-dereference
+    -Wformat=2
+    -Wredundant-decls)
+  if(CMAKE_CXX_FLAGS MATCHES "-fsanitize")
+    # Under sanitizers g++ 12 finds uninitialised members in the standard library's own regex.
+    target_compile_options(VokMemPoolWarnings INTERFACE -Wno-maybe-uninitialized)
+  endif()
+endif()
