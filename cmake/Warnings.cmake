@@ -13,7 +13,13 @@ if(CMAKE_CXX_COMPILER_ID MATCHES "Clang")
     -Wno-padded
     # The registry and the settings start with the library and end with it, by design.
     -Wno-global-constructors
-    -Wno-exit-time-destructors)
+    -Wno-exit-time-destructors
+    # GoogleTest's macros use what they mark as unused.
+    -Wno-used-but-marked-unused
+    # The table of a test does two short things in one lambda.
+    -Wno-comma
+    # An adaptor that is a header alone has no other place for its virtual table.
+    -Wno-weak-vtables)
 elseif(CMAKE_CXX_COMPILER_ID STREQUAL "GNU")
   target_compile_options(VokMemPoolWarnings INTERFACE
     -Werror

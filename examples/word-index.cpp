@@ -9,7 +9,6 @@
 #include <MemPool>
 
 #include <algorithm>
-#include <cctype>
 #include <chrono>
 #include <cstdint>
 #include <filesystem>
@@ -140,6 +139,10 @@ std::vector<std::string> Licences() {
   return {files.begin(), files.end()};
 }
 
+char Lower(char c) { return 'A' <= c && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c; }
+
+bool IsLetter(char c) { return 'a' <= Lower(c) && Lower(c) <= 'z'; }
+
 /// Adds the words of a file, its runs of ASCII letters in lower case, and returns its bytes.
 std::uint64_t Read(const std::string& path, std::uint32_t file, WordIndex& index) {
   std::ifstream text(path, std::ios::binary);
@@ -147,9 +150,9 @@ std::uint64_t Read(const std::string& path, std::uint32_t file, WordIndex& index
   std::uint64_t bytes = 0;
   for (std::uint32_t number = 1; std::getline(text, line); ++number) {
     bytes += line.size() + (text.eof() ? 0 : 1);
-    for (const unsigned char c : line + '\n') {
-      if (std::isalpha(c)) {
-        word += static_cast<char>(std::tolower(c));
+    for (const char c : line + '\n') {
+      if (IsLetter(c)) {
+        word += Lower(c);
       } else if (!word.empty()) {
         index.Add(word, file, number);
         word.clear();
@@ -172,7 +175,7 @@ void Timed(const char* step, Work work) {
 void Answer(WordIndex& index, const std::vector<std::string>& words, const char* when,
             const std::vector<std::string>& names) {
   for (std::string word : words) {
-    std::ranges::transform(word, word.begin(), [](unsigned char c) { return std::tolower(c); });
+    std::ranges::transform(word, word.begin(), Lower);
     std::size_t number = 0;
     std::string first;
     const Node* const node = index.PlaceOf(word);

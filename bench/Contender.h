@@ -1,0 +1,139 @@
+// A contender: the program of one allocator, which stands ready with a workload and works on
+// demand.
+//   lifo/SIZE/DEPTH          DEPTH records taken, given back in reverse, over 4,000 live ones
+//   single/SIZE              one record taken and given back, nothing else live
+//   bulk/SIZE/COUNT/ORDER    COUNT records taken, given back in order, reverse or random
+//   churn/LIVE               one of LIVE records of realistic sizes replaced
+//   mixed/LIVE               the same with 2 % of 1 to 64 KiB
+//   nodes/map, list, umap    1,000 entries put in, looked at and taken out
+//   clear/SIZE/COUNT         COUNT records built and all released at once
+//   threads/COUNT            churn/2000 in COUNT threads, each with a pool of its own
+//   replay/NAME TRACE        a recorded program, again and again in one process, with its pool's
+//   making
+//                            and end
+//   fresh/NAME TRACE         the same, to be done once
+//   resident/SIZE            memory: a million records
+//   resident/NAME TRACE      memory: a recorded program at its peak
+// It says "ready", and answers each "go N" with the nanoseconds of N times and a checksum:
+// processor time, except for threads. A question of memory is answered at once: payload, grown,
+// left, checksum.
+#ifndef VOK_BENCH_CONTENDER_H
+#define VOK_BENCH_CONTENDER_H
+
+#include "Nodes.h"
+#include "Records.h"
+#include "Replay.h"
+#include "Resident.h"
+
+#include <time.h>
+
+#include <cstdint>
+#include <cstdio>
+#include <exception>
+#include <iostream>
+#include <sstream>
+#include <stdexcept>
+#include <string>
+#include <vector>
+
+namespace Bench {
+
+inline std::int64_t Nanoseconds(clockid_t clock) {
+  timespec now{};
+  clock_gettime(clock, &now);
+  return std::int64_t{now.tv_sec} * 1'000'000'000 + now.tv_nsec;
+}
+
+template <class Workload>
+void Serve(Workload&& workload, clockid_t clock = CLOCK_PROCESS_CPUTIME_ID) {
+  std::cout << "ready" << std::endl;
+  std::string word;
+  std::uint32_t times = 0;
+  while (std::cin >> word >> times) {
+    const std::int64_t start = Nanoseconds(clock);
+    const std::uint32_t sum = workload.Run(times);
+    std::cout << Nanoseconds(clock) - start << ' ' << sum << std::endl;
+  }
+}
+
+inline void Answer(const Growth& growth) {
+  std::cout << growth.payload << ' ' << growth.grown << ' ' << growth.left << ' ' << growth.sum
+            << std::endl;
+}
+
+/// The words of a workload's name, with its trace behind them.
+class Request {
+public:
+  explicit Request(const std::vector<std::string>& arguments) {
+    std::istringstream name(arguments.at(0));
+    for (std::string word; std::getline(name, word, '/');)
+      words.push_back(word);
+    words.insert(words.end(), arguments.begin() + 1, arguments.end());
+  }
+
+  bool Is(const char* word, std::size_t count) const {
+    return words.size() == count && words[0] == word;
+  }
+  const std::string& Text(std::size_t i) const { return words[i]; }
+  std::uint32_t Number(std::size_t i) const {
+    return static_cast<std::uint32_t>(std::stoul(words[i]));
+  }
+
+private:
+  std::vector<std::string> words;
+};
+
+/// False if there is no such workload.
+template <class Rival>
+bool Contend(const Request& ask) {
+  constexpr std::uint32_t live = 4000;
+  constexpr std::uint32_t large = 20;
+  if (ask.Is("lifo", 3))
+    Serve(Lifo<Rival>(ask.Number(1), ask.Number(2), live));
+  else if (ask.Is("single", 2))
+    Serve(Lifo<Rival>(ask.Number(1), 1, 0));
+  else if (ask.Is("bulk", 4))
+    Serve(Bulk<Rival>(ask.Number(1), ask.Number(2), ask.Text(3)));
+  else if (ask.Is("churn", 2))
+    Serve(Churn<Rival>(ask.Number(1), 0));
+  else if (ask.Is("mixed", 2))
+    Serve(Churn<Rival>(ask.Number(1), large));
+  else if (ask.Is("nodes", 2) && ask.Text(1) == "map")
+    Serve(TreeNodes<Rival>());
+  else if (ask.Is("nodes", 2) && ask.Text(1) == "list")
+    Serve(ListNodes<Rival>());
+  else if (ask.Is("nodes", 2) && ask.Text(1) == "umap")
+    Serve(HashNodes<Rival>());
+  else if (ask.Is("clear", 3))
+    Serve(Clear<Rival>(ask.Number(1), ask.Number(2)));
+  else if (ask.Is("threads", 2))
+    Serve(Threads<Rival>(ask.Number(1), 2000), CLOCK_MONOTONIC);
+  else if (ask.Is("replay", 3) || ask.Is("fresh", 3))
+    Serve(Replay<Rival>(ask.Text(2)));
+  else if (ask.Is("resident", 2))
+    Answer(GrowthOfRecords<Rival>(ask.Number(1)));
+  else if (ask.Is("resident", 3))
+    Answer(GrowthOfReplay<Rival>(ask.Text(2)));
+  else
+    return false;
+  return true;
+}
+
+template <class Rival>
+int Main(int argc, char** argv) {
+  try {
+    if ((argc == 2 || argc == 3) && Contend<Rival>(Request({argv + 1, argv + argc}))) return 0;
+    std::cerr << "usage: " << argv[0] << " WORKLOAD [TRACE], workloads as in bench/Contender.h\n";
+    return 2;
+  } catch (const std::invalid_argument& error) {
+    std::cerr << argv[0] << ": bad number or order in the workload: " << error.what() << '\n';
+    return 2;
+  } catch (const std::exception& error) {
+    std::cerr << argv[0] << ": " << error.what() << '\n';
+    return 1;
+  }
+}
+
+} // namespace Bench
+
+#endif
