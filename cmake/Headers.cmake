@@ -34,3 +34,4 @@ function(vok_public_header name instance)
 endfunction()
 
 vok_public_header(MemPool "VOK::vector<int>" 11 14 17 20)
+vok_public_header(MemPoolAllocator "VOK::MemPool::Allocator<int>" 17 20)
