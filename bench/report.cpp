@@ -13,6 +13,7 @@
 #include <fstream>
 #include <iostream>
 #include <sstream>
+#include <stdexcept>
 #include <string>
 #include <vector>
 
@@ -44,9 +45,12 @@ double Seconds(Work work) {
 template <class Work>
 double SecondsToFile(const std::string& path, Work work) {
   std::filebuf file;
-  file.open(path, std::ios::out | std::ios::trunc);
+  if (!file.open(path, std::ios::out | std::ios::trunc))
+    throw std::runtime_error("cannot open " + path);
   const Redirection redirection(file);
-  return Seconds(work);
+  const double seconds = Seconds(work);
+  if (!std::cout.good()) throw std::runtime_error("cannot write " + path);
+  return seconds;
 }
 
 double Median(std::vector<double> values) {
@@ -75,14 +79,7 @@ std::vector<unsigned char*> Fill(Mgr& pool, int records) {
   return data;
 }
 
-} // namespace
-
-int main(int argc, char** argv) {
-  if (argc != 2) {
-    std::fprintf(stderr, "usage: report FILE\n");
-    return 2;
-  }
-  const std::string path = argv[1];
+void Measure(const std::string& path) {
   VOK::MemPool::ZOR_VOK_MEMPOOL_ON(true);
   Mgr large("large");
   Mgr small("small");
@@ -106,15 +103,27 @@ int main(int argc, char** argv) {
     detailed.push_back(SecondsToFile(path, [&] { small.DbgDetailed(); }));
   }
   std::remove(path.c_str());
-  if (used != std::uint64_t{1000000} * rounds) {
-    std::fprintf(stderr, "report: the pass met %llu used records\n",
-                 static_cast<unsigned long long>(used));
-    return 1;
-  }
+  if (used != std::uint64_t{1000000} * rounds)
+    throw std::runtime_error("the pass met " + std::to_string(used) + " used records");
   const double floor = Median(headers) + Median(written);
   std::printf("plain    %8.2f ms, %zu lines\n", Median(plain) * 1e3, lines.size());
   std::printf("headers  %8.2f ms\n", Median(headers) * 1e3);
   std::printf("lines    %8.2f ms\n", Median(written) * 1e3);
   std::printf("plain / (headers + lines) %.2f\n", Median(plain) / floor);
   std::printf("detailed %8.2f us a record\n", Median(detailed) / smallRecords * 1e6);
+}
+
+} // namespace
+
+int main(int argc, char** argv) {
+  if (argc != 2) {
+    std::fprintf(stderr, "usage: report FILE\n");
+    return 2;
+  }
+  try {
+    Measure(argv[1]);
+  } catch (const std::exception& error) {
+    std::fprintf(stderr, "report: %s\n", error.what());
+    return 1;
+  }
 }

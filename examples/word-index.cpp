@@ -222,8 +222,11 @@ void Run(Options options) {
     PrintRecord("a posting", "postings", node->first);
     PrintRecord("a word", "nodes", node->text);
   }
+  std::ios state(nullptr); // a report leaves its marks on the stream
+  state.copyfmt(std::cout);
   if (options.report) VOK::MemPool::Dbg();
   if (options.detailed) VOK::MemPool::DbgDetailed();
+  std::cout.copyfmt(state);
   Timed("clear", [&] { index.Clear(); });
   std::ifstream status("/proc/self/status"); // where the system has it
   for (std::string key; status >> key;)

@@ -5,7 +5,7 @@
 #include <cstdlib>
 
 const char* Tarn_Env::GetEnv(const char* key) {
-#ifdef __GLIBC__
+#ifdef __linux__
   return secure_getenv(key);
 #else
   return std::getenv(key);

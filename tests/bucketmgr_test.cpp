@@ -59,7 +59,6 @@ TEST(BucketMgr, WhatEachPointerGetsOfADisabledPool) {
 set on=1; pool on; alloc on used 10 -> #1+2; alloc on ext 2000 -> ext; set on=0; pool a
 enabled a -> false; heap; alloc a zero 0 -> heap : +[0]; alloc a x 10 -> heap : +[10]
 alloc a y 5000 -> heap : +[5000]
-# a size field that reads as a used record's header
 alloc a z 66000 -> heap : +[66000]; show a -> nothing; size a null -> 0; has a null -> false
 free a null -> false; size a x -> 0; has a x -> false; size a y -> 0; has a y -> false
 size a z -> 0; has a z -> false; size a used -> 0; has a used -> false
@@ -249,11 +248,15 @@ TEST(BucketMgr, ScrubbedHeaders) {
   }
 }
 
-// A heap's size field in front of a block can read as a used record's header, or the block can
-// start its page: a disabled pool looks at no bucket. Blocks of the arena, then of the real heap.
+// A heap's size field in front of a block can read as a used record's header, and its bucket's as
+// that of no memory at all: a disabled pool looks at none. First of all such a block at the arena's
+// very start, then blocks of the arena and of the real heap.
 TEST(BucketMgr, DisabledBlocksOfAnySize) {
   Script script;
-  script.Run("set on=0\npool a\nset on=1\npool b\nalloc b p 10");
+  EXPECT_EQ(script.Run("set on=0; pool a; alloc a z 0x1FFFF; has a z; size a z; free a z"),
+            "set on=0; pool a; alloc a z 0x1FFFF -> heap; has a z -> false; size a z -> 0; "
+            "free a z -> true\n");
+  script.Run("set on=1; pool b; alloc b p 10");
   Mgr& pool = script.Pool("a");
   for (const bool arena : {true, false})
     for (unsigned size = 0; size <= 200000; size += size < 3000 ? 1 : 499) {

@@ -78,6 +78,7 @@ TEST(Group, FreeLooksItsBucketUp) {
   EXPECT_FALSE(four.Free(q, nullptr)) << "another Group's";
   EXPECT_FALSE(four.Free(q, pool.FindBucket(q))) << "another Group's, named";
   EXPECT_FALSE(four.Free(nullptr, four.head1));
+  EXPECT_FALSE(four.Free(reinterpret_cast<void*>(4), four.head1)) << "a header at null";
   EXPECT_TRUE(pool.Contains(q) && pool.Contains(p));
   EXPECT_TRUE(four.Free(p, nullptr));
   EXPECT_FALSE(four.Free(p, nullptr)) << "free already";

@@ -210,6 +210,7 @@ TEST_F(Reports, StateOfTheStream) {
                 {"internal, fill #", [](std::ostream& os) { (os << std::internal).fill('#'); }},
                 {"hex, showbase", [](std::ostream& os) { os << std::hex << std::showbase; }},
                 {"boolalpha", [](std::ostream& os) { os << std::boolalpha; }},
+                {"showpos", [](std::ostream& os) { os << std::showpos; }},
                 {"scientific", [](std::ostream& os) { (os << std::scientific).precision(1); }}};
   const struct {
     const char* name;

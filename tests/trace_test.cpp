@@ -1,8 +1,11 @@
 #include "support/Script.h"
 
+#include "diagnostics/ReportText.h"
 #include "services/Trace.h"
 
 #include <gtest/gtest.h>
+#include <iomanip>
+#include <iostream>
 #include <optional>
 #include <sstream>
 
@@ -90,8 +93,31 @@ drop a
 )");
 }
 
-// What a private stream of the platform writes in the classic locale, without a leading 0x.
-TEST(Trace, BarePtrTextIsTheStreams) {
+// A line that can't be written is lost, and the operation that it tells of goes on, also where the
+// program has told the stream to throw.
+TEST(Trace, ADeadStreamStopsNothing) {
+  struct : std::streambuf {
+  } dead;
+  std::streambuf* const before = std::cout.rdbuf(&dead);
+  std::cout.exceptions(std::ios::badbit | std::ios::failbit);
+  ZOR_VOK_MEMPOOL_ON(true);
+  ZOR_VOK_MEMPOOL_TRACE(true);
+  EXPECT_NO_THROW({
+    Mgr pool("dead");
+    void* const p = pool.Alloc(10);
+    EXPECT_TRUE(pool.Contains(p));
+    EXPECT_TRUE(pool.Free(p));
+  });
+  ZOR_VOK_MEMPOOL_TRACE(false);
+  ZOR_VOK_MEMPOOL_ON(false);
+  EXPECT_TRUE(std::cout.good());
+  std::cout.exceptions(std::ios::goodbit);
+  std::cout.rdbuf(before);
+}
+
+// What a private stream of the platform writes in the classic locale: in a trace line without a
+// leading 0x, in a report under width 8.
+TEST(Trace, PointersAreTheStreams) {
   std::vector<std::uintptr_t> values{0, 1, 0xF, 0x10, 0x0AB0, 0xABCDEF, 0x12345678, UINTPTR_MAX};
   for (unsigned bit = 0; bit < 8 * sizeof(void*); ++bit)
     values.push_back(std::uintptr_t{1} << bit);
@@ -106,6 +132,9 @@ TEST(Trace, BarePtrTextIsTheStreams) {
       const std::string text = stream.str();
       EXPECT_EQ(BarePtrText(p).text, text.substr(text.starts_with("0x") ? 2 : 0))
           << "grouping " << grouping;
+      stream.str("");
+      stream << std::setw(8) << p;
+      EXPECT_EQ(PtrText(p), stream.str()) << "grouping " << grouping;
     }
   }
 }

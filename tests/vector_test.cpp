@@ -21,18 +21,18 @@ TEST(Vector, GrowsByItsRules) {
     const ArenaHeap::Use use;
     Vector v;
     v.Reserve(0);
-    for (std::uint32_t i = 0; i < 5; ++i)
+    for (std::uint32_t i = 0; i < 4; ++i)
       v.Append(100 + i);
-    v.Append(v[1]); // of the block that may go
+    v.Append(v[1]); // of the block that goes
     v.Reserve(8);
     v.Reserve(11);
     v.Reserve(3);
-    for (std::uint32_t i = 6; i < 12; ++i)
+    for (std::uint32_t i = 5; i < 12; ++i)
       v.Append(100 + i);
     const ArenaHeap::Use real(false);
     EXPECT_EQ(
         std::vector<std::uint32_t>(v.begin(), v.end()),
-        (std::vector<std::uint32_t>{100, 101, 102, 103, 104, 101, 106, 107, 108, 109, 110, 111}));
+        (std::vector<std::uint32_t>{100, 101, 102, 103, 101, 105, 106, 107, 108, 109, 110, 111}));
     EXPECT_TRUE(v.count == 12 && v.capacity == 22 && v[11] == 111);
   }
   for (const ArenaHeap::Event& event : heap.events)

@@ -1,6 +1,7 @@
 // The table of a bucket's free list, by its links: the order in which the records will be handed
 // out. The chain lies in the records, and a damaged one can run in a circle, so the walk is bound.
 // Test: tests/report_test.cpp.
+#include "diagnostics/Records.h"
 #include "diagnostics/ReportLayout.h"
 #include "diagnostics/ReportText.h"
 #include "engine/Bucket.h"
@@ -9,16 +10,6 @@
 #include <cstdint>
 
 namespace VOK::MemPool {
-
-namespace {
-
-/// Whether a record's header at `offset` lies within the bucket. Offset 0 ends the chain and never
-/// does.
-bool HoldsHeader(const Bucket& bucket, std::uint32_t offset) {
-  return offset >= 2 && offset + recHeaderSize <= bucket.recsSize;
-}
-
-} // namespace
 
 void Bucket::DbgFreeList(std::ostream& os, std::uint32_t depth) const {
   Table table(os, depth, BucketColumns::freeList);

@@ -17,8 +17,7 @@ namespace VOK::MemPool {
 namespace {
 
 /// The stars that a bar is meant to have at most: the width of its column.
-constexpr std::uint32_t barWidth = 50;
-static_assert(PoolColumns::histogram[3].width == barWidth);
+constexpr std::uint32_t barWidth = PoolColumns::histogram[3].width;
 static_assert(BucketColumns::histogram[3].width == barWidth);
 
 std::uint32_t Scale(const SizeFreqMap& sizes) {

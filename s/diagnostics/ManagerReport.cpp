@@ -10,11 +10,13 @@
 #include "engine/BucketMgr.h"
 #include "engine/ExtRec.h"
 #include "engine/Group.h"
+#include "engine/Rec.h"
 #include "services/MgrRegistry.h"
 #include "services/Output.h"
 
 #include <cstdint>
 #include <ostream>
+#include <string>
 
 namespace VOK::MemPool {
 
@@ -87,6 +89,7 @@ void WriteHeader(std::ostream& os, std::uint32_t depth, const BucketMgr& pool,
 }
 
 void ReportAll(bool detailed) {
+  // Through the handle that built the pool, which may hold another one by now.
   for (const auto& [name, pool] : MgrRegistry::Entries())
     pool->mgr->GetBucketMgr()->Dbg(StandardOutput(), 0, detailed, detailed, detailed);
 }

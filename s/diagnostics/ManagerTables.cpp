@@ -36,6 +36,7 @@ void BucketMgr::DbgBuckets(std::ostream& os, std::uint32_t depth) const {
   for (std::uint32_t i = 0; i < numGroups; ++i) {
     if (groups[i] == nullptr) continue;
     for (const Bucket* b = groups[i]->head1; b != nullptr; b = b->next1) {
+      __builtin_prefetch(b->next1); // the next header arrives while this row is written
       const std::uint32_t totalRecs = b->TotalRecs();
       const std::uint32_t usedRecs = totalRecs - b->freeRecs;
       table.Row().Cell(++id).Cell(i).Cell(usedRecs).Cell(b->freeRecs).Cell(totalRecs);
@@ -55,7 +56,7 @@ void BucketMgr::DbgFreeBuckets(std::ostream& os, std::uint32_t depth, std::uint3
     if (groups[i] == nullptr || groups[i]->head2 == nullptr) continue;
     const Bucket* b = groups[i]->head2;
     table.Row().Cell(++id).Cell(i).Cell(b->recSize - recHeaderSize).Cell(CountFree(*groups[i]));
-    table.Cell(0).LastCell(PtrText(b)).End();
+    table.Cell(0u).LastCell(PtrText(b)).End();
     std::uint32_t off = 0;
     while ((b = b->next2) != nullptr)
       table.Row().Blank().Blank().Blank().Blank().Cell(++off).LastCell(PtrText(b)).End();

@@ -114,7 +114,7 @@ void Bucket::DbgMapData(std::ostream& os, std::uint16_t cells, std::uint16_t fir
       TaggedBox(os, "d=", recSize - recHeaderSize);
       break;
     default:
-      TaggedBox(os, "u=", 0);
+      TaggedBox(os, "u=", 0u);
       break;
     }
   }

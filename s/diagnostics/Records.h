@@ -21,6 +21,12 @@ inline std::uint8_t TypeAt(const Bucket& bucket, std::uint32_t offset) {
   return offset + offsetof(Rec, type) < bucket.recsSize ? bucket.RecAt(offset)->type : noType;
 }
 
+/// Whether the header of a record at `offset` lies within the area. Offset 0, which ends a free
+/// list, never does.
+inline bool HoldsHeader(const Bucket& bucket, std::uint32_t offset) {
+  return offset >= 2 && offset + recHeaderSize <= bucket.recsSize;
+}
+
 /// A type byte's name in all reports.
 inline const char* TypeLabel(std::uint8_t type) {
   switch (type) {

@@ -18,8 +18,8 @@ namespace VOK::MemPool {
 /// Three blanks for each step of depth.
 std::string Indent(std::uint32_t depth);
 
-/// The text of a pointer as the platform's stream writes it under width 8 in the classic locale,
-/// its leading "0x" included.
+/// The text of a pointer as the standard library's stream writes it under width 8 in the classic
+/// locale, its leading "0x" included. A test compares the two.
 std::string PtrText(const void* p);
 
 /// A header block line with a number: `label` is 12 characters of name, a colon and a blank.
@@ -50,7 +50,7 @@ public:
   template <class Value>
   Table& Cell(const Value& value) {
     LastCell(value);
-    os << " ";
+    os.put(' ');
     return *this;
   }
 

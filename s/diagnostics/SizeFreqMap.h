@@ -1,5 +1,6 @@
 // The used sizes of a report: how many live records there are of each. It is filled anew for each
-// report, from the standard allocator, so that a report changes no figure that it prints.
+// report, from the standard allocator, so that a report changes no figure that it prints. A struct
+// around the map, since the engine's headers name it without a look inside.
 // Test: tests/report_test.cpp.
 #ifndef VOK_MEMPOOL_SIZEFREQMAP_H
 #define VOK_MEMPOOL_SIZEFREQMAP_H

@@ -6,7 +6,6 @@
 #include "engine/Bucket.h"
 #include "engine/ExtRec.h"
 #include "engine/Group.h"
-#include "engine/Road.h"
 #include "services/Messages.h"
 #include "services/Settings.h"
 #include "services/Trace.h"
@@ -85,7 +84,7 @@ VOK_COLD bool BucketMgr::FreeByRule(void* p) {
     ::operator delete[](p);
     return true;
   }
-  if (Bucket* const bucket = FindBucket(p)) return bucket->parent->TakeBack(p, bucket);
+  if (Bucket* const bucket = FindBucket(p)) return bucket->parent->Free(p, bucket);
   if (ExtRec* const e = ExtRec::FromData(p)) return FreeExtRec(e);
   return false;
 }

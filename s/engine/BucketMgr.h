@@ -6,6 +6,7 @@
 
 #include "engine/SizeClasses.h"
 
+#include <cstddef>
 #include <cstdint>
 #include <iosfwd>
 #include <string>
@@ -98,7 +99,13 @@ private:
 };
 
 // The leading string's size is the standard library's; behind it nothing is padded between fields.
-static_assert(sizeof(BucketMgr) - sizeof(std::string) >= 3 * sizeof(void*) + 6 * 4 + 4);
+static_assert(offsetof(BucketMgr, mgr) == sizeof(std::string));
+static_assert(offsetof(BucketMgr, groups) - offsetof(BucketMgr, mgr) == 1 * sizeof(void*));
+static_assert(offsetof(BucketMgr, extRecs) - offsetof(BucketMgr, mgr) == 2 * sizeof(void*));
+static_assert(offsetof(BucketMgr, numGroups) - offsetof(BucketMgr, mgr) == 3 * sizeof(void*));
+static_assert(offsetof(BucketMgr, keepEmptyBuckets) - offsetof(BucketMgr, numGroups) == 6 * 4);
+static_assert(offsetof(BucketMgr, enabled) - offsetof(BucketMgr, numGroups) == 6 * 4 + 1);
+static_assert(offsetof(BucketMgr, indexRule) - offsetof(BucketMgr, numGroups) == 6 * 4 + 2);
 static_assert(sizeof(void*) != 4 || sizeof(std::string) != 24 || sizeof(BucketMgr) == 64);
 static_assert(sizeof(void*) != 8 || sizeof(std::string) != 32 || sizeof(BucketMgr) == 88);
 

@@ -48,7 +48,8 @@ VOK_COLD bool Group::ReleaseEmptied(Bucket* b) {
 bool Group::Free(void* p, Bucket* bucket) {
   if (bucket == nullptr) bucket = Bucket::FromData(p);
   if (bucket == nullptr || bucket->parent != this) return false;
-  if (p == nullptr || Rec::FromData(p) == nullptr) return false;
+  // In numbers, since the compiler may take it for granted that no difference of a pointer is null.
+  if (reinterpret_cast<std::uintptr_t>(p) <= sizeof(Rec)) return false;
   return TakeBack(p, bucket);
 }
 

@@ -58,8 +58,7 @@ constexpr std::uint32_t RecSizeIndex(std::uint32_t dataSize, std::uint32_t minRe
 /// REQUIRES: a record of `alignment` data bytes fits in `maxRecSize` and has the index 0.
 constexpr std::uint32_t LargestAtIndex0(std::uint32_t minRecSize, std::uint32_t maxRecSize,
                                         std::uint32_t alignment) {
-  const std::uint32_t first = RoundUp(minRecSize, alignment);
-  std::uint32_t dataSize = first;
+  std::uint32_t dataSize = minRecSize;
   while (RecSizeIndex(dataSize, minRecSize, alignment) > 0 || dataSize + recHeaderSize > maxRecSize)
     dataSize -= alignment;
   return dataSize;

@@ -19,7 +19,8 @@ const char* const source = "../s/MemPool";
 
 // Field by field, under whatever state the stream is in; the line number alone has a width.
 __attribute__((cold)) void WriteLine(const char* severity, Text text, unsigned line) {
-  std::ostream& os = StandardOutput();
+  OutputLine output;
+  std::ostream& os = output.Stream();
   os << severity << ":" << source << ":" << std::setw(5) << line << ": ";
   for (const Piece& piece : text)
     piece.WriteTo(os);

@@ -18,22 +18,30 @@ namespace Trace {
 
 namespace {
 
-std::ostream& Begin(const char* letter, const BucketMgr* pool) {
-  return StandardOutput() << "zvpt:" << letter << BarePtrText(pool).text;
+std::ostream& Begin(OutputLine& line, const char* letter, const BucketMgr* pool) {
+  return line.Stream() << "zvpt:" << letter << BarePtrText(pool).text;
 }
 
 } // namespace
 
-void Constructed(const BucketMgr* pool) { Begin("c:", pool) << std::endl; }
+void Constructed(const BucketMgr* pool) {
+  OutputLine line;
+  Begin(line, "c:", pool) << std::endl;
+}
 
-void Destroyed(const BucketMgr* pool) { Begin("d:", pool) << std::endl; }
+void Destroyed(const BucketMgr* pool) {
+  OutputLine line;
+  Begin(line, "d:", pool) << std::endl;
+}
 
 void Allocated(const BucketMgr* pool, const void* p, std::uint32_t size) {
-  Begin("a:", pool) << ":" << BarePtrText(p).text << ":" << size << std::endl;
+  OutputLine line;
+  Begin(line, "a:", pool) << ":" << BarePtrText(p).text << ":" << size << std::endl;
 }
 
 void Freed(const BucketMgr* pool, const void* p) {
-  Begin("f:", pool) << ":" << BarePtrText(p).text << ":" << std::endl;
+  OutputLine line;
+  Begin(line, "f:", pool) << ":" << BarePtrText(p).text << ":" << std::endl;
 }
 
 } // namespace Trace

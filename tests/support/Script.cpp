@@ -324,8 +324,8 @@ std::string Script::HeapEvents() const {
   return text;
 }
 
-void Expect(const std::string& text, const std::source_location& place) {
-  const testing::ScopedTrace trace(place.file_name(), static_cast<int>(place.line()), "script");
+void Expect(const std::string& text, const char* file, int line) {
+  const testing::ScopedTrace trace(file, line, "script");
   Script script;
   const std::string wanted = Choose(text.substr(text.starts_with('\n')));
   EXPECT_EQ(script.Run(wanted), wanted);

@@ -29,7 +29,6 @@
 #include <ios>
 #include <locale>
 #include <map>
-#include <source_location>
 #include <sstream>
 #include <streambuf>
 #include <string>
@@ -130,7 +129,7 @@ private:
 };
 
 /// Runs `text` and expects that it is its own transcript, and that nothing is left on the heap.
-void Expect(const std::string& text,
-            const std::source_location& place = std::source_location::current());
+void Expect(const std::string& text, const char* file = __builtin_FILE(),
+            int line = __builtin_LINE());
 
 #endif

@@ -47,7 +47,7 @@ TEST(Command, ReportForms) {
       Shell("sed 's/   508$/   509/' " + golden + " | vokmempool report --check");
   EXPECT_EQ(damaged.status, 1);
   EXPECT_THAT(damaged.output, HasSubstr("line 10: Used Recs is 509, not 508"));
-  EXPECT_THAT(damaged.output, HasSubstr("vokmempool: -: 2 breaches\n"));
+  EXPECT_THAT(damaged.output, HasSubstr("vokmempool: -: 1 breach\n"));
   const Result cut = Shell("head -8 " + golden + " | vokmempool report");
   EXPECT_EQ(cut.status, 1);
   EXPECT_EQ(cut.output,
@@ -99,10 +99,13 @@ TEST(Command, Ends) {
 
 // A reader that has enough, also where the parent ignores the signal; a full disk is a failure.
 TEST(Command, ClosedOutput) {
-  const std::string much = "for i in {1..400}; do cat " + golden + "; done | ";
+  const std::string much = testing::TempDir() + "vokmempool.much." + std::to_string(getpid());
+  for (int i = 0; i < 400; ++i)
+    std::ofstream(much, std::ios::app) << std::ifstream(golden).rdbuf();
   for (const char* const trap : {"", "trap '' PIPE; "})
-    EXPECT_EQ(Shell(std::string(trap) + much + "{ vokmempool report --text; } | head -1").output,
+    EXPECT_EQ(Shell(trap + ("{ vokmempool report --text " + much + "; } | head -1")).output,
               "MemPool::Mgr demo\n");
+  std::filesystem::remove(much);
   EXPECT_THAT(Shell("vokmempool report --text " + golden + " > /dev/full").output,
               HasSubstr("vokmempool: standard output: can't be written"));
 }
