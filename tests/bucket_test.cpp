@@ -205,7 +205,10 @@ TEST_F(BucketTest, ExtRecLayout) {
 
 // The list c, b, a: which record fits it, and what each Unlink leaves.
 TEST_F(BucketTest, ExtRecList) {
-  ExtRec a{}, b{}, c{}, foreign{};
+  ExtRec a{};
+  ExtRec b{};
+  ExtRec c{};
+  ExtRec foreign{};
   ExtRec* head = nullptr;
   std::uint32_t count = 0;
   EXPECT_FALSE(a.FitsList(head)) << "an empty list";

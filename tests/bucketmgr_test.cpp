@@ -131,8 +131,8 @@ TEST(BucketMgr, Snapshot) {
       Script script;
       const bool keep = std::strstr(c.settings, "keep") != nullptr;
       script.Run(std::string("set ") + c.settings + (on ? " on=1" : " on=0") + "\npool a\n");
-      script.Run("set bucket=1 align=2 max=3 min=4 on=" + std::to_string(!on) +
-                 " keep=" + std::to_string(!keep));
+      script.Run(std::string("set bucket=1 align=2 max=3 min=4 on=") + (on ? "0" : "1") +
+                 " keep=" + (keep ? "0" : "1"));
       const BucketMgr& pool = *script.Pool("a").GetBucketMgr();
       const testing::ScopedTrace row(__FILE__, __LINE__, c.settings);
       EXPECT_EQ(pool.bucketSize, c.bucketSize);

@@ -47,8 +47,8 @@ public:
     on = Random(8) != 0;
     Set("bucket=" + std::to_string(bucketSize) + " align=" + std::to_string(alignment) +
         " max=" + std::to_string(max + Random(std::min(alignment, bucketSize - 3 - max))) +
-        " min=" + std::to_string(min - Random(alignment)) + " keep=" + std::to_string(keep) +
-        " on=" + std::to_string(on));
+        " min=" + std::to_string(min - Random(alignment)) + " keep=" + (keep ? "1" : "0") +
+        " on=" + (on ? "1" : "0"));
     const ArenaHeap::Use use;
     mgr = std::make_unique<Mgr>();
   }
@@ -87,7 +87,7 @@ public:
     const Block block = *chosen;
     *chosen = blocks.back();
     blocks.pop_back();
-    const std::string answers = Answers(block);
+    std::string answers = Answers(block);
     if (!answers.empty()) return answers;
     if (&other != this && on && !block.isExt) {
       if (other.mgr->GetSize(block.p) != 0 || other.mgr->Contains(block.p))
@@ -277,9 +277,9 @@ void ExpectAllSequences(const Reference& reference, const std::map<int, std::pai
 
 TEST(Model, AllSequencesOnBucketsOfTwo) {
   for (const bool keep : {false, true})
-    ExpectAllSequences(Reference(keep), {},
-                       "set on=1 bucket=18 max=8 min=8 keep=" + std::to_string(keep) + "\npool a\n",
-                       8);
+    ExpectAllSequences(
+        Reference(keep), {},
+        std::string("set on=1 bucket=18 max=8 min=8 keep=") + (keep ? "1" : "0") + "\npool a\n", 8);
 }
 
 } // namespace

@@ -327,7 +327,7 @@ std::string Script::HeapEvents() const {
 void Expect(const std::string& text, const char* file, int line) {
   const testing::ScopedTrace trace(file, line, "script");
   Script script;
-  const std::string wanted = Choose(text.substr(text.starts_with('\n')));
+  const std::string wanted = Choose(text.substr(text.starts_with('\n') ? 1 : 0));
   EXPECT_EQ(script.Run(wanted), wanted);
   EXPECT_EQ(script.Finish(), "");
 }

@@ -1,0 +1,18 @@
+// The pools of a text side by side: what each holds, and what of that its callers use.
+// Test: tests/tools/report_test.cpp.
+#ifndef VOK_MEMPOOL_TOOLS_REPORTSUMMARY_H
+#define VOK_MEMPOOL_TOOLS_REPORTSUMMARY_H
+
+#include "ReportModel.h"
+
+#include <string>
+#include <vector>
+
+namespace VOK::MemPool::Tools {
+
+/// A table with a row for each report.
+std::string Summarise(const std::vector<Report>& reports);
+
+} // namespace VOK::MemPool::Tools
+
+#endif

@@ -1,0 +1,16 @@
+// From data back to the text of a report, as the library prints it.
+// Test: tests/tools/report_test.cpp.
+#ifndef VOK_MEMPOOL_TOOLS_REPORTWRITER_H
+#define VOK_MEMPOOL_TOOLS_REPORTWRITER_H
+
+#include "ReportModel.h"
+
+#include <string>
+
+namespace VOK::MemPool::Tools {
+
+std::string WriteReport(const Report& report);
+
+} // namespace VOK::MemPool::Tools
+
+#endif

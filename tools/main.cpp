@@ -1,0 +1,52 @@
+// vokmempool: reads what pools print. Exit status 0: done; 1: a failure, told in one line on the
+// error stream; 2: bad arguments.
+#include "Commands.h"
+#include "Failure.h"
+#include "Files.h"
+
+#include <CLI/CLI.hpp>
+#include <csignal>
+#include <cstdio>
+#include <exception>
+#include <fmt/format.h>
+
+namespace {
+
+using namespace VOK::MemPool;
+
+int Run(int argc, char** argv) {
+  CLI::App app("Reads the reports and the trace lines that pools of libVokMemPool print.",
+               "vokmempool");
+  app.require_subcommand(1);
+  app.footer("Help on a subcommand: vokmempool SUBCOMMAND --help");
+  Tools::AddReport(app);
+  Tools::AddTrace(app);
+  try {
+    app.parse(argc, argv);
+  } catch (const CLI::Success& help) {
+    return app.exit(help);
+  } catch (const CLI::ParseError& error) {
+    fmt::print(stderr, "vokmempool: {}\nusage: vokmempool SUBCOMMAND [OPTIONS] [FILE]\n",
+               error.what());
+    return 2;
+  }
+  return 0;
+}
+
+} // namespace
+
+int main(int argc, char** argv) {
+#ifdef SIGPIPE
+  // A reader that has enough ends the program without a word, whatever its parent has set.
+  std::signal(SIGPIPE, SIG_DFL);
+#endif
+  try {
+    const int status = Run(argc, argv);
+    if (std::fflush(stdout) != 0) throw Tools::Failure("standard output: can't be written");
+    return status;
+  } catch (const std::exception& error) {
+    std::fflush(stdout);
+    fmt::print(stderr, "vokmempool: {}\n", error.what());
+    return 1;
+  }
+}
