@@ -29,7 +29,7 @@ for heap in "" --heap; do
   same expected-repeat.txt $heap --drop second.txt#2 --repeat 3 --query pool first.txt second.txt
 done
 [ "$(found --report first.txt | grep -c '^MemPool::Mgr ')" = 3 ] || { echo "no report"; failed=1; }
-[ "$(found --detailed first.txt | grep -c ' ALL RECORDS MAP (')" -gt 0 ] ||
+[ "$(found --detailed first.txt second.txt | grep -c ' ALL RECORDS MAP (')" -gt 0 ] ||
   { echo "no detailed report"; failed=1; }
 status 0 --help
 status 1 no-such-text.txt
