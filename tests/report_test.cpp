@@ -1,12 +1,15 @@
 #include "support/Reports.h"
 
+#include "diagnostics/ReportText.h"
 #include "engine/Bucket.h"
 #include "engine/BucketMgr.h"
 #include "engine/ExtRec.h"
 #include "services/MgrRegistry.h"
 
 #include <gmock/gmock.h>
+#include <iomanip>
 #include <iostream>
+#include <locale>
 #include <new>
 #include <regex>
 #include <set>
@@ -195,6 +198,30 @@ void ExpectState(const std::ostream& os, std::ios::fmtflags flags, std::streamsi
   EXPECT_EQ(os.precision(), precision);
   EXPECT_EQ(os.fill(), ' ');
   EXPECT_EQ(os.width(), 0);
+}
+
+// The digits of a share are those that the stream would form, and its locale's point stands in
+// them.
+TEST(ReportText, PercentIsTheStreams) {
+  static constexpr Column columns[] = {{"% Used", 8}};
+  struct Comma : std::numpunct<char> {
+    char do_decimal_point() const override { return ','; }
+  };
+  for (const std::locale& locale : {std::locale::classic(), std::locale({}, new Comma)}) {
+    std::ostringstream os;
+    os.imbue(locale);
+    Table table(os, 0, columns);
+    for (std::uint32_t total = 1; total <= 250; ++total)
+      for (std::uint32_t used = 0; used <= total; ++used) {
+        std::ostringstream expected;
+        expected.imbue(locale);
+        expected << std::right << std::setw(7) << std::fixed << std::setprecision(3)
+                 << used * 100.0 / total << "% ";
+        os.str("");
+        table.Row().Percent(used * 100.0 / total);
+        ASSERT_EQ(os.str(), expected.str()) << used << " of " << total;
+      }
+  }
 }
 
 // The state under which a report starts is part of its text, and some of it stays behind.
