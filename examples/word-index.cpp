@@ -1,8 +1,6 @@
 // word-index: on which lines of some texts does a word stand? The index is a tree of words, each
-// with the list of its places. The tree's nodes, the words and the postings lie in a named pool
-// each. A pool aligns a record to 4 and no more, so nodes and postings are made of 32-bit fields
-// alone, and the links between them are kept in such fields. Output is lines of "key: value": a run
-// on pools and one on the heap can stand side by side.
+// with the list of its places. Nodes, words and postings lie in a named pool each. A pool aligns a
+// record to 4 and no more, so they are made of 32-bit fields alone, links between them included.
 #include "Link.h"
 
 #include <CLI/CLI.hpp>
@@ -10,10 +8,8 @@
 
 #include <algorithm>
 #include <chrono>
-#include <cstdint>
 #include <filesystem>
 #include <fstream>
-#include <functional>
 #include <iostream>
 #include <new>
 #include <set>
@@ -141,8 +137,6 @@ std::vector<std::string> Licences() {
 
 char Lower(char c) { return 'A' <= c && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c; }
 
-bool IsLetter(char c) { return 'a' <= Lower(c) && Lower(c) <= 'z'; }
-
 /// Adds the words of a file, its runs of ASCII letters in lower case, and returns its bytes.
 std::uint64_t Read(const std::string& path, std::uint32_t file, WordIndex& index) {
   std::ifstream text(path, std::ios::binary);
@@ -151,12 +145,11 @@ std::uint64_t Read(const std::string& path, std::uint32_t file, WordIndex& index
   for (std::uint32_t number = 1; std::getline(text, line); ++number) {
     bytes += line.size() + (text.eof() ? 0 : 1);
     for (const char c : line + '\n') {
-      if (IsLetter(c)) {
-        word += Lower(c);
-      } else if (!word.empty()) {
-        index.Add(word, file, number);
-        word.clear();
-      }
+      const char letter = Lower(c);
+      if ('a' <= letter && letter <= 'z')
+        word += letter;
+      else if (!word.empty())
+        index.Add(std::exchange(word, ""), file, number);
     }
   }
   if (!text.eof()) throw std::runtime_error("cannot read " + path);
@@ -168,7 +161,7 @@ void Timed(const char* step, Work work) {
   const auto start = std::chrono::steady_clock::now();
   work();
   const std::chrono::duration<double> time = std::chrono::steady_clock::now() - start;
-  std::cout << "seconds to " << step << ": " << time.count() << '\n';
+  std::cout << "seconds to " << step << ": " << std::to_string(time.count()) << '\n';
 }
 
 /// Prints for each word how many places it has, and the first three.
@@ -201,7 +194,6 @@ void Run(Options options) {
   const auto place = options.drop.empty() ? names.begin() : std::ranges::find(names, options.drop);
   if (place == names.end()) throw std::runtime_error("no file to drop: " + options.drop);
   const auto dropped = static_cast<std::uint32_t>(place - names.begin());
-
   VOK::MemPool::ZOR_VOK_MEMPOOL_OFF(options.heap); // counts for the pools to come
   WordIndex index;
   std::uint64_t bytes = 0;
@@ -222,11 +214,8 @@ void Run(Options options) {
     PrintRecord("a posting", "postings", node->first);
     PrintRecord("a word", "nodes", node->text);
   }
-  std::ios state(nullptr); // a report leaves its marks on the stream
-  state.copyfmt(std::cout);
   if (options.report) VOK::MemPool::Dbg();
   if (options.detailed) VOK::MemPool::DbgDetailed();
-  std::cout.copyfmt(state);
   Timed("clear", [&] { index.Clear(); });
   std::ifstream status("/proc/self/status"); // where the system has it
   for (std::string key; status >> key;)
@@ -241,8 +230,7 @@ int main(int argc, char** argv) {
   app.add_option("FILE", options.files, "a text to read");
   app.add_option("--query", options.queries, "a word to look up")->allow_extra_args(false);
   app.add_option("--drop", options.drop, "the file whose places go, by default the first one");
-  app.add_option("--repeat", options.repeat, "read the texts this often, under numbered names")
-      ->check(CLI::Range(1, 9999));
+  app.add_option("--repeat", options.repeat, "how often to read")->check(CLI::Range(1, 9999));
   app.add_flag("--heap", options.heap, "run on the general heap");
   app.add_flag("--report", options.report, "print the pools' reports before they are cleared");
   app.add_flag("--detailed", options.detailed, "print the detailed reports");
@@ -253,8 +241,7 @@ int main(int argc, char** argv) {
   } catch (const CLI::Success& help) {
     return app.exit(help);
   } catch (const CLI::ParseError& error) {
-    std::cerr << "word-index: " << error.what()
-              << "\nusage: word-index [OPTION]... [FILE]..., see word-index --help\n";
+    std::cerr << "word-index: " << error.what() << "\nusage: word-index [OPTION]... [FILE]...\n";
     return 2;
   } catch (const std::exception& error) {
     std::cerr << "word-index: " << error.what() << '\n';
