@@ -1,0 +1,16 @@
+# Removes the files that the last `cmake --install` wrote down in MANIFEST, and the folders of ours
+# that are empty then.
+if(NOT EXISTS "${MANIFEST}")
+  message(FATAL_ERROR "Nothing was installed from here: there is no ${MANIFEST}")
+endif()
+file(STRINGS "${MANIFEST}" files)
+foreach(file IN LISTS files)
+  file(REMOVE "$ENV{DESTDIR}${file}")
+  cmake_path(GET file PARENT_PATH folder)
+  cmake_path(GET folder FILENAME name)
+  file(GLOB left "$ENV{DESTDIR}${folder}/*")
+  if(name STREQUAL "VokMemPool" AND NOT left)
+    file(REMOVE_RECURSE "$ENV{DESTDIR}${folder}")
+  endif()
+endforeach()
+file(REMOVE "${MANIFEST}")
