@@ -2,6 +2,7 @@
 
 #include "engine/Bucket.h"
 #include "engine/ExtRec.h"
+#include "services/Observers.h"
 
 #include <algorithm>
 #include <cstring>
@@ -19,6 +20,7 @@ using Bytes = std::vector<std::uint8_t>;
 Group* const parent = reinterpret_cast<Group*>(std::uintptr_t{0x12345678});
 
 Bytes BytesOf(const void* from, std::size_t count) {
+  ArenaHeap::Open(from, count);
   const auto* const bytes = static_cast<const std::uint8_t*>(from);
   return {bytes, bytes + count};
 }
@@ -26,6 +28,7 @@ Bytes BytesOf(const void* from, std::size_t count) {
 class BucketTest : public testing::Test {
 protected:
   ArenaHeap heap;
+  const Observers::Quiet looking; // into headers, which are nobody else's
 
   // Each bucket of a test is released with it.
   Bucket* Create(std::uint32_t bucketSize, std::uint16_t dataSize) {

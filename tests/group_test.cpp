@@ -3,6 +3,7 @@
 #include "engine/Bucket.h"
 #include "engine/BucketMgr.h"
 #include "engine/Group.h"
+#include "services/Observers.h"
 
 #include <gtest/gtest.h>
 
@@ -66,6 +67,7 @@ show b -> [0] 4: #4() #3(2) free #3 tail #3
 
 // What a pool's own call never asks: a lookup by the Group itself, and another Group's bucket.
 TEST(Group, FreeLooksItsBucketUp) {
+  const Observers::Quiet looking;
   Script script;
   script.Run("set on=1\npool a\nalloc a p 4\nalloc a p1 4\nalloc a q 8\nalloc a q1 8\n"
              "alloc a e 2000");

@@ -6,6 +6,7 @@
 #include "engine/ExtRec.h"
 #include "engine/Group.h"
 #include "engine/Invariants.h"
+#include "services/Observers.h"
 
 #include <algorithm>
 #include <cstdlib>
@@ -112,6 +113,7 @@ public:
 
   // The whole pool, its counters too.
   std::string Check() const {
+    const Observers::Quiet looking;
     const BucketMgr& pool = *mgr->GetBucketMgr();
     if (!IsValid(pool)) return "it is not valid";
     std::uint32_t numUsed = 0;

@@ -28,6 +28,7 @@ protected:
     pool.Free(records[3]);
     bucket = Bucket::FromData(records[0]);
     bytes = reinterpret_cast<std::uint8_t*>(bucket);
+    ArenaHeap::Open(bytes, recsBaseOffset + bucket->recsSize);
     whole.assign(bytes, bytes + recsBaseOffset + bucket->recsSize);
   }
   void TearDown() override {

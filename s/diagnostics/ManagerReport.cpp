@@ -12,6 +12,7 @@
 #include "engine/Group.h"
 #include "engine/Rec.h"
 #include "services/MgrRegistry.h"
+#include "services/Observers.h"
 #include "services/Output.h"
 
 #include <cstdint>
@@ -98,6 +99,7 @@ void ReportAll(bool detailed) {
 
 void BucketMgr::Dbg(std::ostream& os, std::uint32_t depth, bool detailed, bool showRecs,
                     bool showFreeList) const {
+  const Observers::Quiet quiet;
   const Figures figures(*this);
   WriteHeader(os, depth, *this, figures);
   DbgHistogram(os, depth + 2, figures.usedSizes);

@@ -2,6 +2,8 @@
 // Test: tests/bucket_test.cpp.
 #include "engine/Bucket.h"
 
+#include "services/Observers.h"
+
 #include <atomic>
 #include <cassert>
 #include <new>
@@ -18,6 +20,8 @@ Bucket* Bucket::Create(Group* parent, std::uint32_t bucketSize, std::uint16_t da
   b->recsSize = static_cast<std::uint16_t>(size);
   b->recSize = static_cast<std::uint16_t>(stride);
   b->Carve();
+  if (Observers::Watching()) [[unlikely]]
+    b->Announce();
   return b;
 }
 
@@ -37,7 +41,26 @@ void Bucket::Carve() {
   carve(last, 0);
 }
 
-Bucket* Bucket::FromData(const void* p) {
+// To the checkers: the block, and that nobody holds its records.
+VOK_COLD void Bucket::Announce() {
+  Observers::BlockMade(this, recsBaseOffset + recsSize);
+  for (std::uint32_t offset = 2; offset < recsSize; offset += recSize)
+    Observers::Vacant(RecAt(offset)->Data(), recSize - recHeaderSize);
+}
+
+// To the checkers: the end of what is still held, and of the block.
+VOK_COLD void Bucket::Withdraw() {
+  for (std::uint32_t offset = 2; offset < recsSize; offset += recSize) {
+    Rec* const rec = RecAt(offset);
+    if (rec->type == RecType::Used)
+      Observers::RecordGone(this, rec->Data(), recSize - recHeaderSize);
+  }
+  Observers::BlockGone(this, recsBaseOffset + recsSize);
+}
+
+// A stray pointer may have a closed record in front of it, which the address sanitizer must not
+// judge in a build with it.
+__attribute__((no_sanitize_address)) Bucket* Bucket::FromData(const void* p) {
   if (p == nullptr) return nullptr;
   const Rec* const rec = Rec::FromData(p);
   if (rec->type != RecType::Used || rec->Offset() < 2) return nullptr;
@@ -48,6 +71,8 @@ Bucket* Bucket::FromData(const void* p) {
 
 void Bucket::Destroy(Bucket* b) noexcept {
   if (b == nullptr || b->recSize == 0) return;
+  if (Observers::Watching()) [[unlikely]]
+    b->Withdraw();
   b->parent = nullptr;
   b->next1 = b->prev1 = b->next2 = b->prev2 = nullptr;
   b->recsSize = 0;

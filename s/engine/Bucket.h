@@ -114,6 +114,8 @@ private:
   using Recs = vector<const Rec*>;
 
   void Carve();
+  void Announce();
+  void Withdraw();
 
   void DbgHistogram(std::ostream& os, std::uint32_t depth) const;
   void DbgRecs(std::ostream& os, std::uint32_t depth) const;

@@ -1,4 +1,4 @@
-// The making and the end of a pool, and the ways beside the road of a request: traced calls, first
+// The making and the end of a pool, and the ways beside the road of a request: watched calls, first
 // requests of a size class, sizes that the short rule doesn't serve, blocks of the heap.
 // Test: tests/bucketmgr_test.cpp.
 #include "engine/BucketMgr.h"
@@ -7,6 +7,7 @@
 #include "engine/ExtRec.h"
 #include "engine/Group.h"
 #include "services/Messages.h"
+#include "services/Observers.h"
 #include "services/Settings.h"
 #include "services/Trace.h"
 
@@ -14,6 +15,16 @@
 #include <new>
 
 namespace VOK::MemPool {
+
+namespace {
+
+/// Takes a record that goes back to the heap out of the checkers' sight.
+void Forget(ExtRec* e) {
+  Observers::RecordGone(e, e->Data(), e->length);
+  Observers::BlockGone(e, sizeof(ExtRec) + e->length);
+}
+
+} // namespace
 
 BucketMgr::BucketMgr(Mgr* mgr_, const std::string& name_)
     : name(name_), mgr(mgr_), groups(nullptr), extRecs(nullptr), numGroups(0), numExtRecs(0),
@@ -47,14 +58,18 @@ BucketMgr::~BucketMgr() {
   numGroups = 0;
 }
 
-VOK_COLD void* BucketMgr::AllocTraced(std::uint32_t size) {
+VOK_COLD void* BucketMgr::AllocWatched(std::uint32_t size) {
+  const Observers::Quiet quiet;
   void* const p = AllocByRule(size);
-  Trace::Allocated(this, p, size);
+  if (const Bucket* const bucket = FindBucket(p))
+    Observers::RecordMade(bucket, p, size, bucket->recSize - recHeaderSize);
+  if (Trace::IsOn()) Trace::Allocated(this, p, size);
   return p;
 }
 
-VOK_COLD bool BucketMgr::FreeTraced(void* p) {
-  Trace::Freed(this, p);
+VOK_COLD bool BucketMgr::FreeWatched(void* p) {
+  const Observers::Quiet quiet;
+  if (Trace::IsOn()) Trace::Freed(this, p);
   return FreeByRule(p);
 }
 
@@ -76,6 +91,8 @@ VOK_COLD void* BucketMgr::AllocByRule(std::uint32_t size) {
 VOK_COLD void* BucketMgr::AllocExtRec(std::uint32_t size) {
   ExtRec* const e = ExtRec::Create(size);
   e->Link(extRecs, numExtRecs);
+  Observers::BlockMade(e, sizeof(ExtRec) + size);
+  Observers::RecordMade(e, e->Data(), size, size);
   return e->Data();
 }
 
@@ -92,6 +109,7 @@ VOK_COLD bool BucketMgr::FreeByRule(void* p) {
 VOK_COLD bool BucketMgr::FreeExtRec(ExtRec* e) {
   if (!e->FitsList(extRecs)) return false;
   e->Unlink(extRecs, numExtRecs);
+  Forget(e);
   e->Scrub();
   ExtRec::Destroy(e);
   return true;
@@ -108,18 +126,22 @@ Bucket* BucketMgr::FindBucket(const void* p) const {
 }
 
 std::uint32_t BucketMgr::GetSize(const void* p) const {
+  const Observers::Quiet quiet;
   if (const Bucket* const bucket = FindBucket(p)) return bucket->recSize - recHeaderSize;
   if (const ExtRec* const e = ExtRec::FromData(p)) return e->length;
   return 0;
 }
 
 bool BucketMgr::Contains(const void* p) const {
+  const Observers::Quiet quiet;
   return FindBucket(p) != nullptr || ExtRec::FromData(p) != nullptr;
 }
 
 void BucketMgr::Clear() noexcept {
+  const Observers::Quiet quiet;
   for (ExtRec* e = extRecs; e != nullptr;) {
     ExtRec* const next = e->next;
+    Forget(e);
     ExtRec::Destroy(e);
     e = next;
   }

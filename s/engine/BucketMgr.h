@@ -84,10 +84,10 @@ struct BucketMgr {
            bool showFreeList) const;
 
 private:
-  void* AllocTraced(std::uint32_t size);
+  void* AllocWatched(std::uint32_t size);
   void* AllocByRule(std::uint32_t size);
   void* AllocExtRec(std::uint32_t size);
-  bool FreeTraced(void* p);
+  bool FreeWatched(void* p);
   bool FreeByRule(void* p);
   bool FreeExtRec(ExtRec* e);
 

@@ -2,6 +2,8 @@
 // Test: tests/group_test.cpp.
 #include "engine/Group.h"
 
+#include "services/Observers.h"
+
 #include <cassert>
 
 namespace VOK::MemPool {
@@ -50,6 +52,7 @@ bool Group::Free(void* p, Bucket* bucket) {
   if (bucket == nullptr || bucket->parent != this) return false;
   // In numbers, since the compiler may take it for granted that no difference of a pointer is null.
   if (reinterpret_cast<std::uintptr_t>(p) <= sizeof(Rec)) return false;
+  Observers::RecordGone(bucket, p, bucket->recSize - recHeaderSize);
   return TakeBack(p, bucket);
 }
 

@@ -6,6 +6,7 @@
 #include "engine/BucketMgr.h"
 #include "engine/ExtRec.h"
 #include "engine/Group.h"
+#include "services/Observers.h"
 
 #include <cstdint>
 
@@ -54,6 +55,7 @@ bool ExtRecsAreValid(const BucketMgr& pool) {
 } // namespace
 
 bool IsValid(const Bucket& bucket) {
+  const Observers::Quiet quiet;
   if (bucket.recSize == 0) return false;
   const std::uint32_t totalRecs = bucket.TotalRecs();
   return totalRecs >= 1 && 2 + totalRecs * bucket.recSize == bucket.recsSize &&
@@ -62,6 +64,7 @@ bool IsValid(const Bucket& bucket) {
 }
 
 bool IsValid(const Group& group) {
+  const Observers::Quiet quiet;
   std::uint32_t withFree = 0;
   std::uint32_t count = 0;
   const Bucket* prev = nullptr;
@@ -83,6 +86,7 @@ bool IsValid(const Group& group) {
 }
 
 bool IsValid(const BucketMgr& pool) {
+  const Observers::Quiet quiet;
   if (pool.minRecSize > pool.maxRecSize || pool.maxRecSize + recHeaderSize > pool.bucketSize ||
       pool.minRecSize % pool.dataAlignment != 0 || pool.maxRecSize % pool.dataAlignment != 0 ||
       pool.numGroups != (pool.maxRecSize - pool.minRecSize) / pool.dataAlignment + 1)

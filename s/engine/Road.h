@@ -8,7 +8,7 @@
 #include "engine/BucketMgr.h"
 #include "engine/Group.h"
 #include "engine/HotCold.h"
-#include "services/Trace.h"
+#include "services/Observers.h"
 
 #include <cassert>
 
@@ -20,8 +20,8 @@ namespace VOK::MemPool {
 // A disabled pool needs no test here: all entries of its table are null.
 VOK_HOT void* BucketMgr::Alloc(std::uint32_t size) {
   assert(size <= maxRequest);
-  if (Trace::IsOn()) [[unlikely]]
-    return AllocTraced(size);
+  if (Observers::Watching()) [[unlikely]]
+    return AllocWatched(size);
   const std::uint32_t index = indexRule.IndexOf(size);
   if (index >= numGroups) [[unlikely]]
     return AllocByRule(size);
@@ -36,8 +36,8 @@ VOK_HOT void* BucketMgr::Alloc(std::uint32_t size) {
 // and never followed.
 VOK_HOT bool BucketMgr::Free(void* p) {
   if (p == nullptr) return false;
-  if (Trace::IsOn()) [[unlikely]]
-    return FreeTraced(p);
+  if (Observers::Watching()) [[unlikely]]
+    return FreeWatched(p);
   if (!enabled) [[unlikely]]
     return FreeByRule(p);
   const Rec* const rec = Rec::FromData(p);

@@ -3,6 +3,7 @@
 // nothing else secures that the registry and the settings stand before the first Mgr.
 // Test: tests/process_test.cpp, scripts/check-library.
 #include "services/MgrRegistry.h"
+#include "services/Observers.h"
 #include "services/Output.h"
 #include "services/Settings.h"
 
@@ -21,8 +22,13 @@ struct SettingsLife {
   SettingsLife() { Settings::Load(); }
 };
 
+struct ObserversLife {
+  ObserversLife() { Observers::Begin(); }
+};
+
 const RegistryLife registryLife;
 const SettingsLife settingsLife;
+const ObserversLife observersLife;
 
 } // namespace
 

@@ -4,6 +4,7 @@
 
 #include "MemPool"
 #include "services/Messages.h"
+#include "services/Observers.h"
 #include "tarnkit/Tarn_Env.h"
 
 #include <cstdlib>
@@ -132,7 +133,10 @@ bool ZOR_VOK_MEMPOOL_KEEP_EMPTY_BUCKETS() { return Settings::keepEmptyBuckets; }
 void ZOR_VOK_MEMPOOL_KEEP_EMPTY_BUCKETS(bool keep) { Settings::keepEmptyBuckets = keep; }
 
 bool ZOR_VOK_MEMPOOL_TRACE() { return Settings::trace; }
-void ZOR_VOK_MEMPOOL_TRACE(bool trace) { Settings::trace = trace; }
+void ZOR_VOK_MEMPOOL_TRACE(bool trace) {
+  Settings::trace = trace;
+  Observers::Update();
+}
 
 bool ZOR_VOK_MEMPOOL_ON() { return !Settings::off; }
 void ZOR_VOK_MEMPOOL_ON(bool on) { Settings::off = !on; }

@@ -1,6 +1,5 @@
-// The trace lines of all pools: the test of the switch, inline for the road of a request, and the
-// four lines beside it. A line takes nothing from the heap, so that what Free and Alloc have done
-// can't fail any more in telling it.
+// The trace lines of all pools and the test of their switch. A line takes nothing from the heap, so
+// that what Free and Alloc have done can't fail any more in telling it.
 // Test: tests/trace_test.cpp.
 #ifndef VOK_MEMPOOL_TRACE_H
 #define VOK_MEMPOOL_TRACE_H
@@ -24,7 +23,7 @@ struct BarePtrText {
 
 namespace Trace {
 
-VOK_HOT bool IsOn() { return Settings::trace; }
+inline bool IsOn() { return Settings::trace; }
 
 void Constructed(const BucketMgr* pool);
 void Destroyed(const BucketMgr* pool);

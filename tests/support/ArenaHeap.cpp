@@ -13,6 +13,12 @@
 #define ASAN_POISON_MEMORY_REGION(place, size) (static_cast<void>(place), static_cast<void>(size))
 #define ASAN_UNPOISON_MEMORY_REGION(place, size) (static_cast<void>(place), static_cast<void>(size))
 #endif
+#if __has_include(<valgrind/memcheck.h>)
+#include <valgrind/memcheck.h>
+#else
+#define VALGRIND_MAKE_MEM_NOACCESS(place, size) 0
+#define VALGRIND_MAKE_MEM_DEFINED(place, size) 0
+#endif
 
 namespace {
 
@@ -21,6 +27,12 @@ constexpr std::uintptr_t arenaPlace =
 constexpr std::size_t arenaSize = 256u << 20;
 constexpr std::size_t guard = 16; // in front of each block and behind the last
 constexpr unsigned char guardByte = 0xFD;
+
+// As any heap does, the arena tells the checkers what may be touched.
+void Close(const void* place, std::size_t size) {
+  ASAN_POISON_MEMORY_REGION(place, size);
+  static_cast<void>(VALGRIND_MAKE_MEM_NOACCESS(place, size));
+}
 
 ArenaHeap* heap = nullptr;
 thread_local bool inUse = false;
@@ -59,9 +71,14 @@ void Release(void* p, ArenaHeap::Form form, const std::size_t* size = nullptr) {
 
 } // namespace
 
+void ArenaHeap::Open(const void* from, std::size_t size) {
+  ASAN_UNPOISON_MEMORY_REGION(from, size);
+  static_cast<void>(VALGRIND_MAKE_MEM_DEFINED(from, size));
+}
+
 ArenaHeap::ArenaHeap() : end(Arena() + guard) {
   heap = this;
-  ASAN_POISON_MEMORY_REGION(Arena(), arenaSize);
+  Close(Arena(), arenaSize);
 }
 
 ArenaHeap::~ArenaHeap() { heap = nullptr; }
@@ -95,14 +112,14 @@ void* ArenaHeap::Take(std::size_t size, Form form) {
     p = sameRoom.back();
     sameRoom.pop_back();
   }
-  ASAN_UNPOISON_MEMORY_REGION(p - guard, guard + room + guard);
+  Open(p - guard, guard + room + guard);
   std::memset(p - guard, guardByte, guard - 4);
   for (unsigned i = 0; i < 4; ++i)
     p[static_cast<int>(i) - 4] = static_cast<std::byte>(size >> 8 * i);
   std::memset(p, delivered, size);
   std::memset(p + size, guardByte, room - size + guard - 4);
-  ASAN_POISON_MEMORY_REGION(p - guard, guard + room + guard);
-  ASAN_UNPOISON_MEMORY_REGION(p, size);
+  Close(p - guard, guard + room + guard);
+  Open(p, size);
   live[p] = {form, size};
   events.push_back({'+', form, size, p});
   return p;
@@ -121,7 +138,7 @@ void ArenaHeap::GiveBack(void* p, Form form, const std::size_t* size) {
   if (watch) watch(event);
   live.erase(found);
   std::memset(p, released, block.size);
-  ASAN_POISON_MEMORY_REGION(p, block.size);
+  Close(p, block.size);
   spare[RoomOf(std::max<std::size_t>(block.size, 1))].push_back(static_cast<std::byte*>(p));
 }
 
@@ -144,7 +161,7 @@ void ArenaHeap::CheckGuards(const void* p, const Block& block) {
   const std::size_t room = RoomOf(std::max<std::size_t>(block.size, 1));
   const auto* const front = static_cast<const unsigned char*>(p) - guard;
   const unsigned char* const back = front + guard + block.size;
-  ASAN_UNPOISON_MEMORY_REGION(front, guard + room + guard);
+  Open(front, guard + room + guard);
   bool whole = true;
   for (std::size_t i = 0; i < guard - 4; ++i)
     whole &= front[i] == guardByte;
@@ -152,9 +169,9 @@ void ArenaHeap::CheckGuards(const void* p, const Block& block) {
     whole &= front[guard - 4 + i] == static_cast<unsigned char>(block.size >> 8 * i);
   for (const unsigned char* b = back; b < front + guard + room + guard - 4; ++b)
     whole &= *b == guardByte;
-  ASAN_POISON_MEMORY_REGION(front, guard);
-  ASAN_POISON_MEMORY_REGION(front + guard, room + guard);
-  ASAN_UNPOISON_MEMORY_REGION(p, block.size);
+  Close(front, guard);
+  Close(front + guard, room + guard);
+  Open(p, block.size);
   if (!whole) Fault("written beyond its bounds", p, block);
 }
 

@@ -59,6 +59,9 @@ public:
 
   static bool Holds(std::uintptr_t address);
 
+  /// Lifts what the checkers hold of these bytes, so that a test may look at what is nobody's.
+  static void Open(const void* from, std::size_t size);
+
   void* Take(std::size_t size, Form form);
   void GiveBack(void* p, Form form, const std::size_t* size);
 

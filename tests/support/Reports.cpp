@@ -71,8 +71,10 @@ std::map<const void*, std::string> Reports::Standing() const {
     if (event.kind == '-') sizes.erase(event.block);
   }
   std::map<const void*, std::string> blocks;
-  for (const auto& [block, size] : sizes)
+  for (const auto& [block, size] : sizes) {
+    ArenaHeap::Open(block, size);
     blocks[block].assign(static_cast<const char*>(block), size);
+  }
   return blocks;
 }
 

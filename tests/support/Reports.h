@@ -5,6 +5,8 @@
 
 #include "support/Script.h"
 
+#include "services/Observers.h"
+
 #include <functional>
 #include <gtest/gtest.h>
 #include <map>
@@ -16,6 +18,7 @@ protected:
   ArenaHeap heap;
   KeepSettings settings;
   CaughtOutput output{[] {}};
+  const VOK::MemPool::Observers::Quiet looking; // into each byte of the arena
 
   void SetUp() override;
   void TearDown() override;

@@ -6,6 +6,7 @@
 #include "engine/Group.h"
 #include "engine/Invariants.h"
 #include "services/MgrRegistry.h"
+#include "services/Observers.h"
 
 #include <algorithm>
 #include <cstring>
@@ -217,6 +218,7 @@ std::string Script::Alloc(Mgr& pool, const std::string& name, const std::string&
   std::memset(p, 0x5A, size);
   pointers[name] = p;
   names[reinterpret_cast<std::uintptr_t>(p)] = name;
+  const Observers::Quiet looking;
   Bucket* const bucket = pool.GetBucketMgr()->FindBucket(p);
   if (bucket == nullptr) return pool.IsEnabled() ? "ext" : "heap";
   return Name(bucket) + "+" + std::to_string(Rec::FromData(p)->Offset());
@@ -256,6 +258,7 @@ std::uint8_t* Script::Pointer(const std::string& name) const {
 }
 
 std::string Script::Show(Mgr& pool) {
+  const Observers::Quiet looking;
   const BucketMgr& mgr = *pool.GetBucketMgr();
   std::string text;
   for (std::uint32_t i = 0; i < mgr.numGroups; ++i) {

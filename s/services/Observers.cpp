@@ -1,0 +1,163 @@
+// What each checker is told, in its own words. None is a dependency: memcheck is reached by a
+// sequence of instructions that means nothing outside of it, the others by names that stay null
+// where nobody defines them.
+// Test: tests/observer_test.sh.
+#include "services/Observers.h"
+
+#include "services/Settings.h"
+
+#include <cstdint>
+
+// Named by what they mean here; what the linker looks for stands beside.
+#ifdef _WIN32
+constexpr void (*VokAsanPoison)(const volatile void*, std::size_t) = nullptr;
+constexpr void (*VokAsanUnpoison)(const volatile void*, std::size_t) = nullptr;
+constexpr void (*VokHeaptrackMade)(void*, std::size_t) = nullptr;
+constexpr void (*VokHeaptrackGone)(void*) = nullptr;
+#else
+#define VOK_WEAK(name) __asm__(name) __attribute__((weak))
+extern "C" {
+void VokAsanPoison(const volatile void*, std::size_t) VOK_WEAK("__asan_poison_memory_region");
+void VokAsanUnpoison(const volatile void*, std::size_t) VOK_WEAK("__asan_unpoison_memory_region");
+void VokHeaptrackMade(void*, std::size_t) VOK_WEAK("heaptrack_malloc");
+void VokHeaptrackGone(void*) VOK_WEAK("heaptrack_free");
+}
+#endif
+
+namespace VOK::MemPool::Observers {
+
+bool watching = false;
+
+namespace {
+
+namespace Memcheck {
+
+enum Request : std::uintptr_t {
+  CreatePool = 0x1303,
+  DestroyPool = 0x1304,
+  PoolAlloc = 0x1305,
+  PoolFree = 0x1306,
+  ChangeJudging = 0x1801,
+  MakeNoAccess = 0x4D430000, // 'M', 'C': of memcheck alone
+  MakeUndefined = 0x4D430001,
+  MakeDefined = 0x4D430002,
+};
+
+/// Bytes in front of a record and behind it that are still told as its own: the next header.
+constexpr std::uintptr_t redZone = 4;
+
+bool isThere = false;
+
+/// The answer of the valgrind tool that the process runs in, 0 if it has none or runs in none.
+std::uintptr_t Ask(Request request, const void* p, std::uintptr_t second = 0,
+                   std::uintptr_t third = 0) {
+  std::uintptr_t answer = 0;
+  [[maybe_unused]] const volatile std::uintptr_t arguments[] = {
+      request, reinterpret_cast<std::uintptr_t>(p), second, third, 0, 0};
+#if defined(__x86_64__)
+  __asm__ volatile("rolq $3, %%rdi; rolq $13, %%rdi; rolq $61, %%rdi; rolq $51, %%rdi\n\t"
+                   "xchgq %%rbx, %%rbx"
+                   : "=d"(answer)
+                   : "a"(arguments), "0"(answer)
+                   : "cc", "memory");
+#elif defined(__i386__)
+  __asm__ volatile("roll $3, %%edi; roll $13, %%edi; roll $29, %%edi; roll $19, %%edi\n\t"
+                   "xchgl %%ebx, %%ebx"
+                   : "=d"(answer)
+                   : "a"(arguments), "0"(answer)
+                   : "cc", "memory");
+#endif
+  return answer;
+}
+
+void Tell(Request request, const void* p, std::uintptr_t second = 0, std::uintptr_t third = 0) {
+  if (isThere) Ask(request, p, second, third);
+}
+
+/// Only memcheck knows requests of its own letters.
+bool Look() {
+  char byte = 0;
+  return Ask(MakeDefined, &byte, sizeof byte) != 0;
+}
+
+} // namespace Memcheck
+
+namespace AddressSanitizer {
+
+bool IsThere() { return VokAsanPoison != nullptr && VokAsanUnpoison != nullptr; }
+
+// It works in granules of 8 bytes: what it can't mark apart stays open, so that a header, which is
+// never marked, is never hit.
+void Poison(const void* p, std::size_t size) {
+  if (IsThere()) VokAsanPoison(p, size);
+}
+
+void Unpoison(const void* p, std::size_t size) {
+  if (IsThere()) VokAsanUnpoison(p, size);
+}
+
+} // namespace AddressSanitizer
+
+namespace Heaptrack {
+
+bool IsThere() { return VokHeaptrackMade != nullptr && VokHeaptrackGone != nullptr; }
+
+void Made(void* p, std::size_t size) {
+  if (IsThere()) VokHeaptrackMade(p, size);
+}
+
+void Gone(void* p) {
+  if (IsThere()) VokHeaptrackGone(p);
+}
+
+} // namespace Heaptrack
+
+} // namespace
+
+void Begin() {
+  Memcheck::isThere = Memcheck::Look();
+  Update();
+}
+
+void Update() {
+  watching =
+      Settings::trace || Memcheck::isThere || AddressSanitizer::IsThere() || Heaptrack::IsThere();
+}
+
+void BlockMade(void* block, std::size_t size) {
+  constexpr std::size_t links = 2 * sizeof(void*);
+  Memcheck::Tell(Memcheck::CreatePool, block, Memcheck::redZone);
+  Memcheck::Tell(Memcheck::MakeNoAccess, block, size);
+  Memcheck::Tell(Memcheck::PoolAlloc, block, reinterpret_cast<std::uintptr_t>(block), links);
+  Memcheck::Tell(Memcheck::MakeDefined, block, links);
+  // It saw the block come from the heap; what counts are the records.
+  Heaptrack::Gone(block);
+}
+
+void BlockGone(void* block, std::size_t size) {
+  Memcheck::Tell(Memcheck::DestroyPool, block);
+  Memcheck::Tell(Memcheck::MakeUndefined, block, size);
+  AddressSanitizer::Unpoison(block, size);
+}
+
+void Vacant(const void* p, std::size_t capacity) { AddressSanitizer::Poison(p, capacity); }
+
+void RecordMade(const void* block, void* p, std::size_t size, std::size_t capacity) {
+  Memcheck::Tell(Memcheck::PoolAlloc, block, reinterpret_cast<std::uintptr_t>(p), size);
+  AddressSanitizer::Unpoison(p, size);
+  AddressSanitizer::Poison(static_cast<const char*>(p) + size, capacity - size);
+  Heaptrack::Made(p, size);
+}
+
+void RecordGone(const void* block, void* p, std::size_t capacity) {
+  Memcheck::Tell(Memcheck::PoolFree, block, reinterpret_cast<std::uintptr_t>(p));
+  Vacant(p, capacity);
+  Heaptrack::Gone(p);
+}
+
+void Quiet::Judge(bool judging) {
+  Memcheck::Tell(Memcheck::ChangeJudging,
+                 reinterpret_cast<const void*>(judging ? std::uintptr_t(-1) : std::uintptr_t(1)));
+}
+
+} // namespace VOK::MemPool::Observers
