@@ -1,0 +1,17 @@
+// Trace a run: each event of a pool writes a line. docs/messages.md explains them, and the program
+// vokmempool adds them up. With ZOR_VOK_MEMPOOL_TRACE=1 in the environment any program does so.
+#include <MemPool>
+
+int main() {
+  using namespace VOK::MemPool;
+  ZOR_VOK_MEMPOOL_ON(true);
+  ZOR_VOK_MEMPOOL_TRACE(true);
+  Mgr pool("pool"), other("other");
+  void* small = pool.Alloc(10);
+  void* large = pool.Alloc(2000);
+  pool.Alloc(0);
+  other.Free(small); // false: not its record
+  pool.Free(small);
+  pool.Free(large);
+  pool.Free(nullptr); // no line
+}
