@@ -1,5 +1,7 @@
 // The adaptors: alignment under all settings, the bytes that it costs, real containers, objects
 // behind unique pointers and behind their own operator new, and nothing left in a pool.
+#include "children/parts_module.h"
+
 #include <MemPoolAllocator>
 
 #include <gtest/gtest.h>
@@ -189,6 +191,7 @@ TEST(Allocator, RefusesWhatWouldEndTheProcess) {
     EXPECT_THROW(MakeUnique<Wide[]>(pool, most / sizeof(Wide) + 1), std::bad_array_new_length);
     using Pointer = std::unique_ptr<int>; // the count in front of them makes it too much
     EXPECT_THROW(MakeUnique<Pointer[]>(pool, most / sizeof(Pointer)), std::bad_array_new_length);
+    EXPECT_THROW(MakeUnique<char[][3]>(pool, most / 3 + 1), std::bad_array_new_length);
     std::vector<int, Allocator<int>> vector(pool);
     EXPECT_EQ(vector.max_size(), (limit - 7) / sizeof(int));
     EXPECT_THROW(vector.reserve(vector.max_size() + 1), std::length_error);
@@ -223,16 +226,14 @@ TEST_P(Alignment, ServesContainers) {
     set.insert(std::make_unique<int>(i));
     wides.push_back({});
     ASSERT_TRUE(IsAligned(&map.find(i)->second, alignof(Text)));
-    ASSERT_TRUE(IsAligned(set.begin()->get(), alignof(int)));
+    ASSERT_TRUE(IsAligned(&*set.begin(), alignof(std::unique_ptr<int>)));
     ASSERT_TRUE(IsAligned(&wides.back(), alignof(Wide)));
   }
   for (int i = 0; i < 300; i += 2)
     map.erase(i);
   EXPECT_EQ(map.size(), 150U);
-  EXPECT_EQ(map.at(89).size(), 89U);
-  EXPECT_EQ(table.at(Text("77", a)).size(), 77U);
-  EXPECT_EQ(table.at(Text("77", a)).back(), 0.5);
-  EXPECT_EQ(set.size(), 300U);
+  EXPECT_EQ(map.at(89), Text(89, 'x', a));
+  EXPECT_EQ(table.at(Text("77", a)), Vector<double>(77, 0.5, a));
   set.extract(set.begin());
   EXPECT_EQ(set.size(), 299U);
 
@@ -252,31 +253,35 @@ TEST_P(Alignment, ServesContainers) {
   EXPECT_EQ(other, List<int>({1, 2, 3}, a));
 }
 
-/// Throws at the making of the n-th that lives.
-struct Brittle {
-  static inline int living = 0;
-  static inline int limit = 0;
-  Brittle() { Live(); }
-  Brittle(const Brittle&) { Live(); }
-  Brittle& operator=(const Brittle&) = default;
-  ~Brittle() { --living; }
-  static void Live() {
+/// Tells of its making and its end, and throws where too many live.
+struct Witness {
+  static inline int living, limit;
+  static inline std::string told;
+  const char name;
+  double number = 1;
+  Witness() : name(static_cast<char>('a' + living)) {
     if (living == limit) throw std::runtime_error("one too many");
     ++living;
+    told += {'+', name};
   }
-  double number = 1;
+  Witness(const Witness&) : Witness() {}
+  Witness& operator=(const Witness&) { return *this; }
+  ~Witness() {
+    --living;
+    told += {'-', name};
+  }
 };
 
 TEST_P(Alignment, LosesNothingToAnException) {
   Pool pool(GetParam());
-  for (Brittle::limit = 0; Brittle::limit < 6; ++Brittle::limit) {
-    EXPECT_THROW(Vector<Brittle>(6, pool).resize(7), std::runtime_error);
-    EXPECT_THROW(List<Brittle>(7, Allocator<Brittle>(pool)), std::runtime_error);
-    EXPECT_THROW(MakeUnique<Brittle[]>(pool, 7), std::runtime_error);
-    EXPECT_EQ(Brittle::living, 0);
+  for (Witness::limit = 0; Witness::limit < 6; ++Witness::limit) {
+    EXPECT_THROW(Vector<Witness>(6, pool).resize(7), std::runtime_error);
+    EXPECT_THROW(List<Witness>(7, Allocator<Witness>(pool)), std::runtime_error);
+    EXPECT_THROW(MakeUnique<Witness[]>(pool, 7), std::runtime_error);
+    EXPECT_EQ(Witness::living, 0);
   }
-  Brittle::limit = 0;
-  EXPECT_THROW(MakeUnique<Brittle>(pool), std::runtime_error);
+  Witness::limit = 0;
+  EXPECT_THROW(MakeUnique<Witness>(pool), std::runtime_error);
 }
 
 TEST_P(Alignment, ServesNestedContainersOfAResource) {
@@ -337,34 +342,55 @@ void MakeAll(Mgr& pool) {
         MakeUnique<Part<N>[]>(pool, 5);
     parts = MakeUnique<Part<N>[]>(pool, 99);
     const auto none = MakeUnique<Part<N>[]>(pool, 0);
-    EXPECT_EQ(Part<N>::living, 102);
-    const auto numbers = MakeUnique<std::int16_t[]>(pool, N);
-    EXPECT_EQ(numbers[N - 1], 0);
+    const auto grid = MakeUnique<const Part<N>[][2][3]>(pool, 5);
+    EXPECT_EQ(Part<N>::living, 132);
+    const auto numbers = MakeUnique<std::int16_t[][N]>(pool, N);
+    EXPECT_EQ(numbers[N - 1][N - 1], 0);
     base.get_deleter()(nullptr);
   }
   EXPECT_EQ(Part<N>::living, 0);
 }
 
+/// Calls `use` for some alignments, each given as a constant.
+template <class Use>
+void ForAlignments(Use use) {
+  [&]<std::size_t... N>(std::index_sequence<N...>) {
+    (use(std::integral_constant<std::size_t, N>()), ...);
+  }
+  (std::index_sequence<1, 2, 4, 8, 16, 32, 64>());
+}
+
 TEST_P(Alignment, ServesUniquePointers) {
   Pool pool(GetParam());
-  MakeAll<1>(pool);
-  MakeAll<2>(pool);
-  MakeAll<4>(pool);
-  MakeAll<8>(pool);
-  MakeAll<16>(pool);
-  MakeAll<32>(pool);
-  MakeAll<64>(pool);
+  ForAlignments([&](auto alignment) { MakeAll<alignment()>(pool); });
 }
+
+TEST(Deleter, MakesAndDestroysArraysInTheStandardsOrder) {
+  Pool pool(defaults);
+  Witness::limit = 12;
+  const auto toldOf = [](auto make) {
+    Witness::told.clear();
+    make();
+    return Witness::told;
+  };
+  EXPECT_EQ(toldOf([&] { MakeUnique<Witness[]>(pool, 3); }), "+a+b+c-c-b-a");
+  EXPECT_EQ(toldOf([&] { MakeUnique<Witness[][2][2]>(pool, 3); }),
+            toldOf([] { std::make_unique<Witness[][2][2]>(3); }));
+}
+
+template <class From, class To>
+constexpr bool isAsStandard =
+    std::is_convertible_v<Deleter<From>, Deleter<To>> ==
+    std::is_convertible_v<std::default_delete<From>, std::default_delete<To>>;
 
 TEST(Deleter, ConvertsAsTheStandardOneDoes) {
   using D = Both<1>;
-  static_assert(std::is_convertible_v<Deleter<D>, Deleter<Base>>);
   static_assert(std::is_convertible_v<Deleter<D>, Deleter<const Second>>);
   static_assert(!std::is_convertible_v<Deleter<Base>, Deleter<D>>);
-  static_assert(!std::is_convertible_v<Deleter<const D>, Deleter<D>>);
-  static_assert(std::is_convertible_v<Deleter<D[]>, Deleter<const D[]>>);
-  static_assert(!std::is_convertible_v<Deleter<D[]>, Deleter<Base[]>>);
-  static_assert(!std::is_convertible_v<Deleter<D>, Deleter<D[]>>);
+  static_assert(isAsStandard<D, Base> && isAsStandard<const D, D> && isAsStandard<D, D[]>);
+  static_assert(isAsStandard<D[], const D[]> && isAsStandard<D[], Base[]>);
+  static_assert(isAsStandard<D[][2], const D[][2]> && isAsStandard<D[][2], D[][3]>);
+  static_assert(isAsStandard<D[][2], D[]> && isAsStandard<D[], D>);
   static_assert(!std::is_invocable_v<Deleter<Base[]>, D*>);
   static_assert(sizeof(std::unique_ptr<D, Deleter<D>>) == 2 * sizeof(void*));
 }
@@ -374,9 +400,6 @@ struct OnParts {
 };
 struct OffParts {
   static constexpr const char* name = "heap parts";
-};
-struct OtherParts {
-  static constexpr const char* name = "parts";
 };
 
 template <std::size_t N, class Tag>
@@ -431,32 +454,32 @@ void UseAll() {
   }
 }
 
-template <class Tag>
-void UseAllAlignments() {
-  UseAll<1, Tag>();
-  UseAll<4, Tag>();
-  UseAll<8, Tag>();
-  UseAll<16, Tag>();
-  UseAll<64, Tag>();
-}
-
 TEST(Pooled, TakesEveryFormFromOneStandingPool) {
   Set({4, 4010, 8, 1000, false});
-  UseAllAlignments<OffParts>();
+  ForAlignments([](auto alignment) { UseAll<alignment(), OffParts>(); });
   Set(defaults);
   EXPECT_EQ(GetMgr("parts"), nullptr);
-  UseAllAlignments<OnParts>();
+  ForAlignments([](auto alignment) { UseAll<alignment(), OnParts>(); });
   Mgr* const pool = GetMgr("parts");
   ASSERT_NE(pool, nullptr);
   EXPECT_TRUE(pool->IsEnabled());
   EXPECT_FALSE(GetMgr("heap parts")->IsEnabled());
   EXPECT_EQ((&Bolt<8, OnParts>::Pool()), pool);
-  EXPECT_EQ((&Nut<1, OtherParts>::Pool()), pool) << "as from another module";
   {
     const std::unique_ptr<Nut<8, OnParts>> nut(new Nut<8, OnParts>);
     EXPECT_EQ(InUse(*pool), 1U);
   }
   EXPECT_EQ(InUse(*pool), 0U);
+}
+
+TEST(Pooled, MeetsInOnePoolFromTwoModules) {
+  Set(defaults);
+  EXPECT_NE(partsModule.pool, &Rivet::Pool) << "each module has its own";
+  const std::unique_ptr<Rivet> made(partsModule.make());
+  EXPECT_STREQ(Rivet::Pool().GetName(), "rivets");
+  EXPECT_EQ(&partsModule.pool(), &Rivet::Pool());
+  partsModule.destroy(new Rivet);
+  EXPECT_EQ(InUse(Rivet::Pool()), 1U);
 }
 
 } // namespace
