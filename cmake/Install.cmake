@@ -19,6 +19,22 @@ install(EXPORT VokMemPoolTargets
 install(FILES ${CMAKE_CURRENT_BINARY_DIR}/VokMemPoolConfigVersion.cmake
   DESTINATION ${VOK_MEMPOOL_CMAKE_DIR} COMPONENT development)
 
+# The pages of section 3, and the function by which each setting is looked up as a link to one.
+install(FILES
+  docs/man/MemPoolAllocator.3
+  docs/man/VOK_MemPool.3
+  docs/man/VOK_MemPool_Mgr.3
+  DESTINATION ${CMAKE_INSTALL_MANDIR}/man3 COMPONENT development)
+foreach(setting ON OFF BUCKET_SIZE MAX_RECORD_SIZE MIN_RECORD_SIZE DATA_ALIGNMENT
+    KEEP_EMPTY_BUCKETS TRACE)
+  set(VOK_MEMPOOL_LINK ${CMAKE_CURRENT_BINARY_DIR}/man/ZOR_VOK_MEMPOOL_${setting}.3)
+  file(WRITE ${VOK_MEMPOOL_LINK} ".so man3/VOK_MemPool.3\n")
+  install(FILES ${VOK_MEMPOOL_LINK}
+    DESTINATION ${CMAKE_INSTALL_MANDIR}/man3 COMPONENT development)
+endforeach()
+install(FILES docs/man/libVokMemPool.7
+  DESTINATION ${CMAKE_INSTALL_MANDIR}/man7 COMPONENT development)
+
 # pkg-config finds the prefix from where the file lies.
 file(RELATIVE_PATH VOK_MEMPOOL_UP /${CMAKE_INSTALL_LIBDIR}/pkgconfig /)
 configure_file(cmake/vokmempool.pc.in vokmempool.pc @ONLY)
