@@ -19,8 +19,12 @@
 #include <utility>
 #include <vector>
 
+#ifdef _WIN32
+#include <windows.h>
+#else
 #include <sys/wait.h>
 #include <unistd.h>
+#endif
 
 namespace {
 
@@ -40,15 +44,12 @@ const char* const allKeys[] = {on,      alsoOn,    trace, bucketSize, maxSize,
 using Env = std::vector<std::pair<const char*, const char*>>;
 using Script = std::vector<std::string>;
 
-const std::string children = VOK_MEMPOOL_CHILDREN "/";
-const std::string child = children + "pool_child";
-const std::string host = children + "pool_host";
+const std::string child = VOK_MEMPOOL_CHILD;
+const std::string host = VOK_MEMPOOL_HOST;
+const std::string clientChild = VOK_MEMPOOL_CLIENT_CHILD;
 const std::string client = VOK_MEMPOOL_CLIENT;
 const std::string library = VOK_MEMPOOL_LIBRARY;
 const std::string launcher = VOK_MEMPOOL_LAUNCHER;
-
-/// The status of a process that its own abort ends.
-constexpr int aborted = 128 + 6;
 
 struct Result {
   std::string command; ///< what was run, for the report of a failure
@@ -57,32 +58,83 @@ struct Result {
   std::string err;
 };
 
-std::string TakeFile(const std::string& path) {
-  std::stringstream text;
-  text << std::ifstream(path, std::ios::binary).rdbuf();
-  std::filesystem::remove(path);
-  return text.str();
+#ifdef _WIN32
+constexpr bool isWindows = true;
+/// The status of a process that a refusal at load ends: of its abort or, where the loader takes
+/// the exception itself, the exception's code.
+constexpr int refused = sizeof(void*) == 4 ? 3 : 0x20474343;
+
+void SetKey(const char* key, const char* value) { SetEnvironmentVariableA(key, value); }
+
+/// Runs the command with its output in two files; returns its status.
+int Execute(std::string command, const std::string& out, const std::string& err) {
+  const auto create = [](const std::string& path) {
+    SECURITY_ATTRIBUTES inherited{sizeof inherited, nullptr, TRUE};
+    return CreateFileA(path.c_str(), GENERIC_WRITE, 0, &inherited, CREATE_ALWAYS, 0, nullptr);
+  };
+  STARTUPINFOA start{};
+  start.cb = sizeof start;
+  start.dwFlags = STARTF_USESTDHANDLES;
+  start.hStdOutput = create(out);
+  start.hStdError = create(err);
+  PROCESS_INFORMATION process{};
+  CreateProcessA(nullptr, command.data(), nullptr, nullptr, TRUE, 0, nullptr, nullptr, &start,
+                 &process);
+  DWORD status = DWORD(-1);
+  WaitForSingleObject(process.hProcess, INFINITE);
+  GetExitCodeProcess(process.hProcess, &status);
+  for (HANDLE handle : {start.hStdOutput, start.hStdError, process.hThread, process.hProcess})
+    CloseHandle(handle);
+  return static_cast<int>(status);
+}
+#else
+constexpr bool isWindows = false;
+constexpr int refused = 128 + 6;
+
+void SetKey(const char* key, const char* value) {
+  if (value != nullptr)
+    setenv(key, value, 1);
+  else
+    unsetenv(key);
 }
 
-/// Runs the program with just these of the library's keys in its environment. The one function
-/// that knows the platform.
+int Execute(const std::string& command, const std::string& out, const std::string& err) {
+  const std::string call = "ulimit -c 0; exec " + command + " >" + out + " 2>" + err;
+  const int status = std::system(call.c_str());
+  return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+}
+#endif
+
+/// The file's text, whose lines must end as the platform's do, with "\n" for each end.
+std::string TakeFile(const std::string& path) {
+  std::stringstream bytes;
+  bytes << std::ifstream(path, std::ios::binary).rdbuf();
+  std::filesystem::remove(path);
+  std::string text = bytes.str();
+  const std::size_t size = text.size();
+  for (std::size_t at = 0; (at = text.find("\r\n", at)) != std::string::npos;)
+    text.erase(at, 1);
+  const auto numLines = static_cast<std::size_t>(std::count(text.begin(), text.end(), '\n'));
+  EXPECT_EQ(size - text.size(), isWindows ? numLines : 0) << text;
+  return text;
+}
+
+/// Runs the program with just these of the library's keys in its environment.
 Result RunChild(const std::string& program, const Script& arguments, const Env& env = {}) {
   Result result;
   for (const char* key : allKeys)
-    unsetenv(key);
+    SetKey(key, nullptr);
   for (const auto& [key, value] : env) {
-    setenv(key, value, 1);
+    SetKey(key, value);
     result.command += std::string(key) + "=\"" + value + "\" ";
   }
-  std::string call = launcher + " \"" + program + "\"";
+  std::string call = launcher + (launcher.empty() ? "\"" : " \"") + program + "\"";
   for (const std::string& argument : arguments)
     call += " \"" + argument + "\"";
   result.command += call;
   const std::string stem =
       std::string("process_test.") + testing::UnitTest::GetInstance()->current_test_info()->name();
-  call = "ulimit -c 0; exec " + call + " >" + stem + ".out 2>" + stem + ".err";
-  const int status = std::system(call.c_str());
-  result.status = WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+  result.status = Execute(call, stem + ".out", stem + ".err");
   result.out = TakeFile(stem + ".out");
   std::istringstream lines(TakeFile(stem + ".err"));
   for (std::string line; std::getline(lines, line);) {
@@ -270,24 +322,32 @@ TEST(Refusal, AbortsTheStartOfAProgram) {
       EXPECT_EQ(Masked(result.out),
                 banner ? Banner({"4010", "4", "0", row.max, row.min, "0", "1"}) : "")
           << result.command;
-      EXPECT_EQ(result.status, aborted) << result.command;
+      EXPECT_EQ(result.status, refused) << result.command;
     }
   }
 }
 
+const Env refusedEnv = {{minSize, "1000"}};
+const char* const refusal = "line: MIN_RECORD_SIZE >= MAX_RECORD_SIZE (1000>=1000)\n";
+
+TEST(Refusal, FailsALoadAtRunTime) {
+  const Result result = RunChild(host, {"open-directly " + library}, refusedEnv);
+  EXPECT_EQ(Refusal(result.err), refusal);
+  const bool loaderTakesIt = isWindows && sizeof(void*) == 8;
+  EXPECT_EQ(result.out, loaderTakesIt ? "error " + std::to_string(refused) + "\n" : "");
+  EXPECT_EQ(result.status, loaderTakesIt ? 0 : refused);
+}
+
+#ifndef _WIN32
 TEST(Refusal, IsThrownAsItsTextByALoadAtRunTime) {
-  const Env env = {{minSize, "1000"}};
   for (const Script& script : {Script{"open " + library}, {"grouping", "open " + library}}) {
-    const Result result = RunChild(host, script, env);
-    EXPECT_EQ(Refusal(result.err), "line: MIN_RECORD_SIZE >= MAX_RECORD_SIZE (1000>=1000)\n");
+    const Result result = RunChild(host, script, refusedEnv);
+    EXPECT_EQ(Refusal(result.err), refusal);
     EXPECT_EQ(result.out, result.err) << result.command;
     EXPECT_EQ(result.status, 0) << result.command;
   }
-  const Result direct = RunChild(host, {"open-directly " + library}, env);
-  EXPECT_EQ(Refusal(direct.err), "line: MIN_RECORD_SIZE >= MAX_RECORD_SIZE (1000>=1000)\n");
-  EXPECT_EQ(direct.out, "");
-  EXPECT_EQ(direct.status, aborted);
 }
+#endif
 
 // The statements that stop a process, by the beginning of their text.
 const std::string duplicate = "Duplicate Vok_MemPool::Mgr name encountered ";
@@ -411,6 +471,8 @@ TEST(Text, KeepsTheStreamsStateAndNoOther) {
   Expect(RunChild(child,
                   {"global", "nameless 10", "names", "trace 1", "alloc 171", "alloc 1073741824"}),
          1, "1 pools: __VOK_MEMPOOL_00010\nzvpt:a:@1:@2:171\n" + stop);
+  EXPECT_THAT(RunChild(child, {"hex", "pool a", "report"}).out,
+              testing::HasSubstr("   Bucket Size :      FAA\n"));
   // The stream's own locale groups its numbers, the source line's among them.
   const Result imbued = RunChild(
       child, {"imbue", "nameless 10", "names", "trace 1", "alloc 171", "alloc 1073741824"});
@@ -421,16 +483,18 @@ TEST(Text, KeepsTheStreamsStateAndNoOther) {
 }
 
 TEST(Registry, IsLeftByAClientsStaticPoolsAfterMain) {
-  Expect(RunChild(children + "client_child", {}, {{trace, "1"}, {on, "1"}}), 0,
+  Expect(RunChild(clientChild, {}, {{trace, "1"}, {on, "1"}}), 0,
          "zvpt:c:@1\nzvpt:c:@2\nmain begins\nzvpt:c:@3\nmade __VOK_MEMPOOL_00002\n"
          "3 pools, found\nzvpt:a:@3:@4:10\nzvpt:f:@3:@4:\nserved\nzvpt:d:@3\nmain ends\n"
          "zvpt:d:@2\nzvpt:d:@1\n");
 }
 
 TEST(Registry, IsEmptyBehindItsEndAndAPoolStillServes) {
+  const std::string end = "zvpt:d:@2\nzvpt:d:@1\n";
+  const std::string use = "zvpt:a:@3:@4:10\nzvpt:f:@3:@4:\nserved\nzvpt:d:@3\n";
+  // On Windows a program's handlers run ahead of any library's.
   const std::string behind =
-      "zvpt:d:@2\nzvpt:d:@1\n"
-      "0 pools, not found\nzvpt:a:@3:@4:10\nzvpt:f:@3:@4:\nserved\nzvpt:d:@3\n";
+      isWindows ? "3 pools, found\n" + use + end : end + "0 pools, not found\n" + use;
   const Script script = {"await-exit", "open " + client, "make"};
   const std::string made = "zvpt:c:@1\nzvpt:c:@2\nzvpt:c:@3\nmade __VOK_MEMPOOL_00002\n";
   const Env env = {{trace, "1"}, {on, "1"}};
@@ -453,6 +517,10 @@ TEST(Registry, GoesWithTheLibraryAtItsUnloading) {
   const std::size_t half = result.out.find("not loaded\n") + 11;
   EXPECT_EQ(Masked(result.out.substr(0, half)), life);
   EXPECT_EQ(Masked(result.out.substr(std::min(half, result.out.size()))), life);
+}
+
+TEST(Exceptions, ReachTheProgram) {
+  Expect(RunChild(child, {"pool a", "overfill"}), 0, "bad_alloc\n");
 }
 
 TEST(Threads, LoseNothingWithAPoolEach) {

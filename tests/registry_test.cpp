@@ -126,7 +126,7 @@ TEST(RegistryDeathTest, Duplicate) {
           const Mgr second(again);
         },
         testing::ExitedWithCode(1),
-        "^ERROR:../s/MemPool:  [ 0-9][0-9][0-9]: Duplicate Vok_MemPool::Mgr name encountered '" +
+        "^ERROR:../s/MemPool:  ...: Duplicate Vok_MemPool::Mgr name encountered '" +
             std::string(name) + "'\n$")
         << name;
 }

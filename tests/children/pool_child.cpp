@@ -65,6 +65,17 @@ void ShowNames(const std::string&) {
   Say(text);
 }
 
+// A vector at the end of its range takes no more: an exception of the library's own code.
+void Overfill(const std::string&) {
+  VOK::vector<Mgr*> mgrs;
+  mgrs.count = mgrs.capacity = 1U << 31;
+  try {
+    GetMgrs(mgrs);
+  } catch (const std::bad_alloc&) {
+    Say("bad_alloc");
+  }
+}
+
 // Ends with a pool built under the switches alone, so that no size can stop it.
 void ShowSettings(const std::string&) {
   std::string text;
@@ -140,6 +151,8 @@ const Verb verbs[] = {
     {"alloc", Alloc},
     {"free", Free},
     {"names", ShowNames},
+    {"overfill", Overfill},
+    {"report", [](const std::string&) { pools.back()->Dbg(); }},
     {"hex", [](const std::string&) { std::cout << std::hex << std::uppercase; }},
     {"global", [](const std::string&) { std::locale::global(GroupingLocale()); }},
     {"imbue", [](const std::string&) { std::cout.imbue(GroupingLocale()); }},

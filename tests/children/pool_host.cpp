@@ -3,12 +3,33 @@
 #include "pool_client.h"
 
 #include <cstdlib>
-#include <dlfcn.h>
 #include <string>
-#include <sys/auxv.h>
 #include <vector>
 
+#ifdef _WIN32
+#include <windows.h>
+#else
+#include <dlfcn.h>
+#endif
+#ifdef __GLIBC__
+#include <sys/auxv.h>
+#endif
+
 namespace {
+
+#ifdef _WIN32
+// What the platform has instead, under the names that the rest of this program uses.
+constexpr int RTLD_NOW = 0;
+constexpr int RTLD_NOLOAD = 1;
+void* dlopen(const char* path, int mode) {
+  return mode == RTLD_NOW ? LoadLibraryA(path) : GetModuleHandleA(path);
+}
+void* dlsym(void* library, const char* name) {
+  return reinterpret_cast<void*>(GetProcAddress(static_cast<HMODULE>(library), name));
+}
+void dlclose(void* library) { FreeLibrary(static_cast<HMODULE>(library)); }
+std::string dlerror() { return "error " + std::to_string(GetLastError()); }
+#endif
 
 void* handle;
 const PoolClient* client;
@@ -58,7 +79,9 @@ const Verb verbs[] = {
      [](const std::string& path) {
        Say(dlopen(path.c_str(), RTLD_NOW | RTLD_NOLOAD) != nullptr ? "loaded" : "not loaded");
      }},
+#ifdef __GLIBC__
     {"raised", [](const std::string&) { Say(getauxval(AT_SECURE) != 0 ? "raised" : "plain"); }},
+#endif
     {"grouping",
      [](const std::string&) {
        std::locale::global(GroupingLocale());

@@ -5,7 +5,12 @@
 #include <cstdlib>
 #include <cstring>
 #include <new>
+
+#ifdef _WIN32
+#include <windows.h>
+#else
 #include <sys/mman.h>
+#endif
 
 #ifdef __SANITIZE_ADDRESS__
 #include <sanitizer/asan_interface.h>
@@ -37,10 +42,18 @@ void Close(const void* place, std::size_t size) {
 ArenaHeap* heap = nullptr;
 thread_local bool inUse = false;
 
+// Fresh memory at that place, or whatever the platform gives if it is taken.
+void* Map(void* place, std::size_t size) {
+#ifdef _WIN32
+  return VirtualAlloc(place, size, MEM_RESERVE | MEM_COMMIT, PAGE_READWRITE);
+#else
+  return mmap(place, size, PROT_READ | PROT_WRITE,
+              MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE | MAP_FIXED_NOREPLACE, -1, 0);
+#endif
+}
+
 std::byte* MapArena() {
-  void* const place =
-      mmap(reinterpret_cast<void*>(arenaPlace), arenaSize, PROT_READ | PROT_WRITE,
-           MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE | MAP_FIXED_NOREPLACE, -1, 0);
+  void* const place = Map(reinterpret_cast<void*>(arenaPlace), arenaSize);
   if (reinterpret_cast<std::uintptr_t>(place) != arenaPlace) {
     std::fputs("ArenaHeap: the arena's place is taken\n", stderr);
     std::abort();
