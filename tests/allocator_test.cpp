@@ -26,7 +26,7 @@ namespace {
 using namespace VOK::MemPool;
 
 constexpr bool isWide = sizeof(void*) == 8;
-constexpr bool isEmulated = sizeof(VOK_MEMPOOL_LAUNCHER) > 1;
+constexpr bool isEmulated = VOK_MEMPOOL_EMULATED;
 
 struct Settings {
   unsigned alignment, bucket, min, max;
