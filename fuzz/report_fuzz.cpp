@@ -1,6 +1,8 @@
 // Hostile text for the reader of reports: what it takes, it gives back byte for byte, by way of
-// JSON too; all else it refuses. A text that starts with a brace is taken for a document.
+// JSON too, and draws it; all else it refuses. A text that starts with a brace is taken for a
+// document.
 #include "Failure.h"
+#include "PictureData.h"
 #include "ReportCheck.h"
 #include "ReportJson.h"
 #include "ReportReader.h"
@@ -34,6 +36,8 @@ void ReadText(const std::string& input) {
     CheckReport(report);
   }
   Demand(!Summarise(reports).empty());
+  const PictureSource source{"fuzz", reports};
+  Demand(PictureData(&source, source).find('<') == std::string::npos);
   std::string json;
   WriteJson(reports, [&](std::string_view piece) { json += piece; });
   Demand(TextOf(ReadJson(json)) == TextOf(reports));

@@ -10,6 +10,7 @@ class App;
 namespace VOK::MemPool::Tools {
 
 void AddReport(CLI::App& app);
+void AddPicture(CLI::App& app);
 void AddTrace(CLI::App& app);
 
 } // namespace VOK::MemPool::Tools

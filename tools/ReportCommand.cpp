@@ -4,8 +4,8 @@
 #include "Failure.h"
 #include "Files.h"
 #include "ReportCheck.h"
+#include "ReportFile.h"
 #include "ReportJson.h"
-#include "ReportReader.h"
 #include "ReportSummary.h"
 #include "ReportWriter.h"
 
@@ -32,19 +32,8 @@ void Check(const std::vector<Report>& reports, const std::string& file) {
   if (count > 0) throw Failure(fmt::format("{}: {} breach{}", file, count, count == 1 ? "" : "es"));
 }
 
-std::vector<Report> Read(const Options& options) {
-  const std::string text = Input(options.file).ReadAll();
-  try {
-    std::vector<Report> reports = options.fromJson ? ReadJson(text) : ReadReports(text);
-    if (reports.empty()) throw Failure("there is no report in it");
-    return reports;
-  } catch (const Failure& failure) {
-    throw Failure(fmt::format("{}: {}", options.file, failure.what()));
-  }
-}
-
 void Run(const Options& options) {
-  const std::vector<Report> reports = Read(options);
+  const std::vector<Report> reports = ReadReportFile(options.file, options.fromJson);
   if (options.json)
     WriteJson(reports, Print);
   else if (options.check)

@@ -3,17 +3,9 @@
 #include "Files.h"
 
 #include <algorithm>
-#include <cstdint>
 #include <fmt/format.h>
 
 namespace VOK::MemPool::Tools {
-
-namespace {
-
-struct Bytes {
-  std::uint64_t held = 0;    ///< heap blocks of buckets and ext records, with their headers
-  std::uint64_t payload = 0; ///< data bytes of used records
-};
 
 Bytes BytesOf(const Report& report) {
   // Five pointers and 8 bytes are the header of a bucket, two pointers and 8 bytes that of an ext
@@ -31,8 +23,6 @@ Bytes BytesOf(const Report& report) {
   }
   return bytes;
 }
-
-} // namespace
 
 std::string Summarise(const std::vector<Report>& reports) {
   constexpr auto form = "{:<{}} {:>10} {:>10} {:>10} {:>13} {:>13} {:>8}\n";

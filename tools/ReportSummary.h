@@ -5,10 +5,18 @@
 
 #include "ReportModel.h"
 
+#include <cstdint>
 #include <string>
 #include <vector>
 
 namespace VOK::MemPool::Tools {
+
+struct Bytes {
+  std::uint64_t held = 0;    ///< heap blocks of buckets and ext records, with their headers
+  std::uint64_t payload = 0; ///< data bytes of used records
+};
+
+Bytes BytesOf(const Report& report);
 
 /// A table with a row for each report.
 std::string Summarise(const std::vector<Report>& reports);

@@ -20,6 +20,7 @@ int Run(int argc, char** argv) {
   app.require_subcommand(1);
   app.footer("Help on a subcommand: vokmempool SUBCOMMAND --help");
   Tools::AddReport(app);
+  Tools::AddPicture(app);
   Tools::AddTrace(app);
   try {
     app.parse(argc, argv);

@@ -68,6 +68,24 @@ TEST(Command, Trace) {
             "vokmempool: -: it has no line 4, only 3\n");
 }
 
+// The page itself is looked at in a browser, by picture_test.py.
+TEST(Command, Picture) {
+  const std::string detailed = VOK_MEMPOOL_GOLDEN "/report/detailed-64.txt";
+  EXPECT_THAT(Shell("vokmempool picture - -o - < " + detailed).output,
+              StartsWith("<!DOCTYPE html>\n"));
+  const std::string out = testing::TempDir() + "vokmempool.html." + std::to_string(getpid());
+  const auto picture = [&](const std::string& report) {
+    return Shell(report + " | vokmempool picture - -o " + out + "; echo $?").output;
+  };
+  const std::string isPlain = "vokmempool: -: line 1: a plain report, which has no records to draw";
+  EXPECT_EQ(picture("cat " + golden), isPlain + "; DbgDetailed writes them\n1\n");
+  EXPECT_EQ(picture("sed 99q " + detailed),
+            "vokmempool: -: line 100: expected an empty line, found the end of the text\n1\n");
+  EXPECT_FALSE(std::filesystem::exists(out));
+  EXPECT_EQ(picture("cat " + golden + " " + detailed), isPlain + "\n0\n");
+  std::filesystem::remove(out);
+}
+
 TEST(Command, Ends) {
   const struct {
     const char* command;
@@ -80,6 +98,9 @@ TEST(Command, Ends) {
       {"vokmempool trace --bucket-size 9", 2, "vokmempool: "},
       {"vokmempool trace --at 0", 2, "vokmempool: "},
       {"vokmempool trace --name cache", 2, "vokmempool: "},
+      {"vokmempool picture report.txt", 2, "vokmempool: "},
+      {"vokmempool picture -o page.html", 2, "vokmempool: "},
+      {"vokmempool picture /no/such -o page.html", 1, "vokmempool: /no/such: can't be opened: "},
       {"vokmempool report /no/such", 1, "vokmempool: /no/such: can't be opened: No such file"},
       {"vokmempool report /", 1, "vokmempool: /: can't be read: Is a directory"},
       {"vokmempool report < /dev/null", 1, "vokmempool: -: there is no report in it\n"},
@@ -92,7 +113,7 @@ TEST(Command, Ends) {
     EXPECT_EQ(result.status, c.status) << c.command;
     EXPECT_THAT(result.output, StartsWith(c.output)) << c.command;
   }
-  for (const char* const command : {"report", "trace"})
+  for (const char* const command : {"report", "picture", "trace"})
     EXPECT_THAT(Shell("vokmempool " + std::string(command) + " --help").output,
                 HasSubstr("Example: "));
 }

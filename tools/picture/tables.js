@@ -1,0 +1,104 @@
+// Elements, numbers, bars, and tables that sort.
+"use strict";
+
+/** An element with attributes (a function is a listener) and children. */
+function make(name, attributes = {}, ...children) {
+  const element = document.createElement(name);
+  for (const [key, value] of Object.entries(attributes)) {
+    if (typeof value === "function") element.addEventListener(key, value);
+    else if (value !== null && value !== false) element.setAttribute(key, value === true ? "" : value);
+  }
+  element.append(...children.filter((child) => child !== null));
+  return element;
+}
+
+const numberFormat = new Intl.NumberFormat("en");
+const formatNumber = (number) => numberFormat.format(number);
+const formatPercent = (percent) => `${percent.toFixed(1)} %`;
+const counted = (number, one, many = `${one}s`) => `${formatNumber(number)} ${number === 1 ? one : many}`;
+
+/** The largest of what a key gives for some items, and at least 1. */
+const largest = (items, keyOf) => items.reduce((most, item) => Math.max(most, keyOf(item)), 1);
+
+/** A bar of `share` from 0 to 1. */
+function makeBar(share, kind = "") {
+  const fill = make("span");
+  fill.style.width = `${Math.min(1, Math.max(0, share)) * 100}%`;
+  return make("span", { class: `bar ${kind}`, "aria-hidden": "true" }, fill);
+}
+
+/** Signed and in the colour of its kind, nothing for 0. */
+function makeChange(number, kind) {
+  if (number === 0) return make("span", { class: "quiet" }, "·");
+  return make("span", { class: kind }, (kind === "came" ? "+" : "−") + formatNumber(number));
+}
+
+/** Sorts by a key; texts, numbers and hexadecimal texts of one width compare as they should. */
+function compareBy(keyOf, isDescending) {
+  const sign = isDescending ? -1 : 1;
+  return (a, b) => {
+    const x = keyOf(a), y = keyOf(b);
+    return x < y ? -sign : x > y ? sign : 0;
+  };
+}
+
+/** A heading that sorts by its column when it is pressed. `sort` is what the table is sorted by. */
+function makeSortHeading(name, column, sort, press) {
+  const isSorted = sort.column === column;
+  const arrow = isSorted ? (sort.isDescending ? "↓" : "↑") : "";
+  const attributes = {
+    class: column.kind ?? null,
+    "aria-sort": isSorted ? (sort.isDescending ? "descending" : "ascending") : "none",
+    ...(name === "th" ? { scope: "col" } : { role: "columnheader" }),
+  };
+  const button = make("button", { type: "button", title: column.about ?? null, click: () => press(column) },
+    make("span", {}, column.title), make("span", { class: "arrow", "aria-hidden": "true" }, arrow));
+  return make(name, attributes, button);
+}
+
+/** The sort after a press on a column: numbers begin with the largest, a second press turns it. */
+function pressed(sort, column) {
+  const isAgain = sort.column === column;
+  return { column, isDescending: isAgain ? !sort.isDescending : column.kind === "number" };
+}
+
+/**
+ * A table of rows. A column has `title`, `kind` ("number" or none), `key` of a row to sort by, and
+ * `show` for what a cell holds. A long table shows its first rows in the order chosen, and their
+ * number.
+ */
+function makeTable(label, columns, rows, { most = 500, rowAttributes = () => ({}) } = {}) {
+  const table = make("table", { "aria-label": label });
+  let sort = { column: null, isDescending: false };
+  const fill = () => {
+    const focused = [...table.querySelectorAll("th button")].indexOf(document.activeElement);
+    const sorted = sort.column === null ? rows : [...rows].sort(compareBy(sort.column.key, sort.isDescending));
+    const press = (column) => {
+      sort = pressed(sort, column);
+      fill();
+    };
+    const body = sorted.slice(0, most).map((row) =>
+      make("tr", rowAttributes(row), ...columns.map((column) =>
+        make("td", { class: column.kind ?? null }, column.show(row)))));
+    table.replaceChildren(
+      make("thead", {}, make("tr", {}, ...columns.map((column) => makeSortHeading("th", column, sort, press)))),
+      make("tbody", {}, ...body));
+    if (rows.length > most)
+      table.append(make("tfoot", {}, make("tr", {}, make("td", { colspan: columns.length },
+        `the first ${formatNumber(most)} of ${formatNumber(rows.length)} rows`))));
+    if (focused >= 0) table.querySelectorAll("th button")[focused].focus();
+  };
+  fill();
+  return make("div", { class: "scroll" }, table);
+}
+
+/** A column of numbers under a key of the rows. */
+const numberColumn = (title, key, about) => ({
+  title, about, kind: "number", key: (row) => row[key], show: (row) => formatNumber(row[key]),
+});
+
+/** The two columns of what changed, none where a single report is shown. */
+const changeColumns = () => (!isPair ? [] : ["came", "went"].map((kind) => ({
+  title: kind === "came" ? "Came" : "Went",
+  kind: "number", key: (row) => row[kind], show: (row) => makeChange(row[kind], kind),
+})));
