@@ -86,6 +86,15 @@ TEST(Command, Picture) {
   std::filesystem::remove(out);
 }
 
+// Two seconds without a byte, and what comes then is late.
+TEST(Command, ProgressOnATerminal) {
+  const std::string slow = "{ sleep 2.1; echo zvpt:c:a0; } | ";
+  const std::string bar = "\r0 MB read\x1b[K";
+  EXPECT_THAT(Shell("script -qec '" + slow + VOK_MEMPOOL_PROGRAM " trace' /dev/null").output,
+              testing::AllOf(StartsWith(bar), HasSubstr("\r\x1b[K")));
+  EXPECT_THAT(Shell(slow + "vokmempool trace").output, testing::Not(HasSubstr(bar)));
+}
+
 TEST(Command, Ends) {
   const struct {
     const char* command;
