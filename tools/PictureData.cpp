@@ -71,7 +71,8 @@ private:
     const auto behind =
         std::upper_bound(buckets.begin(), buckets.end(), breach.line,
                          [](std::size_t line, const BucketReport& b) { return line < b.line; });
-    Json bucket, record;
+    Json bucket;
+    Json record;
     if (behind != buckets.begin()) {
       const auto i = static_cast<std::size_t>(behind - buckets.begin()) - 1;
       bucket = i;
@@ -135,7 +136,8 @@ public:
     const std::vector<bool> now = pair.now != nullptr ? UsedIn(*pair.now) : std::vector<bool>();
     const std::vector<bool> before =
         pair.before != nullptr ? UsedIn(*pair.before) : std::vector<bool>();
-    std::size_t came = 0, went = 0;
+    std::size_t came = 0;
+    std::size_t went = 0;
     for (std::size_t i = 0; i < std::max(now.size(), before.size()); ++i) {
       const bool isUsed = i < now.size() && now[i];
       const bool wasUsed = i < before.size() && before[i];
@@ -222,7 +224,7 @@ private:
         OrNone(pair.before).bucketReports, OrNone(pair.now).bucketReports,
         [](const BucketReport& bucket) { return std::pair(bucket.addr.value, bucket.recSize); });
     for (const Pair<BucketReport>& bucket : matched) {
-      const Report& from = bucket.now != nullptr ? *pair.now : *pair.before;
+      const Report& from = OrNone(bucket.now != nullptr ? pair.now : pair.before);
       const auto i = static_cast<std::size_t>(&bucket.Get() - from.bucketReports.data());
       buckets.Add(from, bucket.Get(), &from == &report ? faults.BitsOf(i) : "");
       buckets.AddChange(bucket);

@@ -91,7 +91,7 @@ def test_one(browser, folder, text):
     same(browser.evaluate(LOOKS), [[expected_looks(b) for b in pool] for pool in pools], "the cells")
     same(browser.evaluate(LINKS), [[b["links"] for b in pool] for pool in pools], "the links")
     browser.evaluate("document.querySelector('.head button').focus()")
-    browser.press(*["Tab"] * 6, "Home", "ArrowRight")  # past the other headings, into the list
+    browser.press(*["Tab"] * 6, "PageUp", "Home", "ArrowRight")  # past the other headings, into the list
     first = pools[0][0]
     size = sorted(map(int, first["used"] | first["free"]))
     tip = browser.evaluate(TIP)
@@ -108,7 +108,7 @@ def test_one(browser, folder, text):
     same(browser.evaluate("document.getElementById('tip').hidden"), True, "the key Escape")
     x, y = browser.evaluate("""(() => {
         const box = document.querySelector('.strips canvas').getBoundingClientRect();
-        return [box.left + 1, box.top + 10];
+        return [box.left + 3, box.top + 10];
     })()""")
     browser.move(1, 1)
     browser.move(x, y)
@@ -132,7 +132,7 @@ def test_damaged(browser, folder, text):
     found = sum(bucket["damaged"] for pool in browser.evaluate(LOOKS) for bucket in pool)
     same(found >= 2, True, f"{found} damaged records")
     browser.evaluate("document.querySelector('.strips').focus()")
-    browser.press("Home")
+    browser.press("PageUp", "Home")
     same("type\nUNKN" in browser.evaluate(TIP), True, browser.evaluate(TIP))
     browser.press("d")
     same("next\n9999, no record" in browser.evaluate(TIP), True, browser.evaluate(TIP))

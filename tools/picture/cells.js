@@ -2,7 +2,7 @@
 // record is tall, a free one low, what is served next has a mark below, what is damaged one above.
 "use strict";
 
-const cellMetrics = { above: 5, bar: 14, below: 6, low: 4, gap: 1, least: 3 };
+const cellMetrics = { above: 5, bar: 14, below: 6, low: 4, gap: 1, least: 3, side: 2 };
 cellMetrics.line = cellMetrics.above + cellMetrics.bar + cellMetrics.below;
 
 /** damaged, used, came, went or free; "used" is what stayed where two reports are compared. */

@@ -42,8 +42,11 @@ function makeGuide() {
     make("li", {}, makeSwatch(look, isHead), text)));
   const select = make("select", {
     "aria-label": "Go to a pool",
-    change: () => pools[select.value].section.scrollIntoView(),
-  }, ...pools.map((pool) => make("option", { value: pool.index }, pool.label)));
+    change: () => {
+      pools[select.value].section.scrollIntoView();
+      select.value = "";
+    },
+  }, make("option", { value: "" }, "Go to pool"), ...pools.map((pool) => make("option", { value: pool.index }, pool.label)));
   const guide = document.getElementById("guide");
   guide.append(legend);
   if (pools.length > 1) guide.append(select);

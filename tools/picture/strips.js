@@ -222,7 +222,9 @@ class BucketList {
     const { bucket } = row;
     const { width, perLine } = this.gridOf(bucket);
     const lines = Math.max(1, Math.ceil(bucket.count / perLine));
-    const context = prepareCanvas(row.querySelector("canvas"), this.strip, lines * cellMetrics.line);
+    const { side } = cellMetrics; // room for a frame around the outer cells
+    const context = prepareCanvas(row.querySelector("canvas"), this.strip + 2 * side, lines * cellMetrics.line);
+    context.translate(side, 0);
     const place = (record) => [(record % perLine) * width, Math.floor(record / perLine) * cellMetrics.line, width];
     for (let i = 0; i < bucket.count; ++i)
       paintCell(context, lookOf(bucket, i), bucket.isHead(i), ...place(i));
@@ -244,7 +246,7 @@ class BucketList {
     if (row === undefined) return null;
     const { width, perLine } = this.gridOf(bucket);
     const box = row.querySelector("canvas").getBoundingClientRect();
-    const left = box.left + (record % perLine) * width;
+    const left = box.left + cellMetrics.side + (record % perLine) * width;
     const top = box.top + Math.floor(record / perLine) * cellMetrics.line;
     return { left, width, top, bottom: top + cellMetrics.line };
   }
@@ -254,7 +256,7 @@ class BucketList {
     const bucket = event.target.tagName === "CANVAS" ? event.target.closest(".row").bucket : null;
     if (bucket === null) return null;
     const { width, perLine } = this.gridOf(bucket);
-    const column = Math.floor(event.offsetX / width);
+    const column = Math.floor((event.offsetX - cellMetrics.side) / width);
     const record = Math.floor(event.offsetY / cellMetrics.line) * perLine + column;
     return column >= 0 && column < perLine && record >= 0 && record < bucket.count ? { bucket, record } : null;
   }
@@ -293,9 +295,15 @@ class BucketList {
 
   enter() {
     if (!this.body.matches(":focus-visible")) return;
-    const inView = this.items.find((item, i) => !item.isHeading && this.rows.has(i));
-    if (this.cursor === null && inView !== undefined) this.go(inView.bucket, 0);
-    else this.showTip();
+    const start = this.cursor ?? this.firstInView();
+    if (start !== null) this.go(start.bucket, start.record);
+  }
+
+  /** Where the cursor begins. */
+  firstInView() {
+    const top = this.head.getBoundingClientRect().bottom - this.body.getBoundingClientRect().top;
+    const item = this.items.find(({ isHeading }, i) => !isHeading && this.tops[i] >= top);
+    return item === undefined ? null : { bucket: item.bucket, record: 0 };
   }
 
   leave() {
@@ -321,7 +329,8 @@ class BucketList {
   press(event) {
     if (event.ctrlKey || event.altKey || event.metaKey || event.target !== this.body) return;
     if (event.key === "Escape") return this.mark("cursor", null);
-    const target = this.cursor === null ? null : this.targetOf(event.key, this.cursor);
+    const start = this.cursor ?? this.firstInView();
+    const target = start === null ? null : this.targetOf(event.key, start);
     if (target === null) return;
     event.preventDefault();
     this.unpoint();
