@@ -265,7 +265,6 @@ struct Witness {
     told += {'+', name};
   }
   Witness(const Witness&) : Witness() {}
-  Witness& operator=(const Witness&) { return *this; }
   ~Witness() {
     --living;
     told += {'-', name};
@@ -302,14 +301,11 @@ TEST_P(Alignment, ServesNestedContainersOfAResource) {
 template <std::size_t N>
 struct alignas(N) Part {
   static inline int living = 0;
-  Part() { Enter(); }
-  Part(const Part&) { Enter(); }
-  Part& operator=(const Part&) = default;
-  ~Part() { --living; }
-  void Enter() {
+  Part() {
     ++living;
     EXPECT_TRUE(IsAligned(this, N));
   }
+  ~Part() { --living; }
   char bytes[N];
 };
 
@@ -352,17 +348,14 @@ void MakeAll(Mgr& pool) {
 }
 
 /// Calls `use` for some alignments, each given as a constant.
-template <class Use>
-void ForAlignments(Use use) {
-  [&]<std::size_t... N>(std::index_sequence<N...>) {
-    (use(std::integral_constant<std::size_t, N>()), ...);
-  }
-  (std::index_sequence<1, 2, 4, 8, 16, 32, 64>());
+template <std::size_t... alignments, class Use>
+void ForEach(Use use) {
+  (use(std::integral_constant<std::size_t, alignments>()), ...);
 }
 
 TEST_P(Alignment, ServesUniquePointers) {
   Pool pool(GetParam());
-  ForAlignments([&](auto alignment) { MakeAll<alignment()>(pool); });
+  ForEach<1, 2, 4, 8, 16, 32, 64>([&](auto alignment) { MakeAll<alignment()>(pool); });
 }
 
 TEST(Deleter, MakesAndDestroysArraysInTheStandardsOrder) {
@@ -456,10 +449,10 @@ void UseAll() {
 
 TEST(Pooled, TakesEveryFormFromOneStandingPool) {
   Set({4, 4010, 8, 1000, false});
-  ForAlignments([](auto alignment) { UseAll<alignment(), OffParts>(); });
+  ForEach<1, 4, 8, 16, 64>([](auto alignment) { UseAll<alignment(), OffParts>(); });
   Set(defaults);
   EXPECT_EQ(GetMgr("parts"), nullptr);
-  ForAlignments([](auto alignment) { UseAll<alignment(), OnParts>(); });
+  ForEach<1, 4, 8, 16, 64>([](auto alignment) { UseAll<alignment(), OnParts>(); });
   Mgr* const pool = GetMgr("parts");
   ASSERT_NE(pool, nullptr);
   EXPECT_TRUE(pool->IsEnabled());
