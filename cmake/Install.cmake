@@ -35,7 +35,10 @@ endforeach()
 install(FILES docs/man/libVokMemPool.7
   DESTINATION ${CMAKE_INSTALL_MANDIR}/man7 COMPONENT development)
 
-# pkg-config finds the prefix from where the file lies.
+# pkg-config finds the prefix from where the file lies, so both folders must lie below it.
+if(IS_ABSOLUTE "${CMAKE_INSTALL_LIBDIR}" OR IS_ABSOLUTE "${CMAKE_INSTALL_INCLUDEDIR}")
+  message(FATAL_ERROR "CMAKE_INSTALL_LIBDIR and CMAKE_INSTALL_INCLUDEDIR are folders below the prefix")
+endif()
 file(RELATIVE_PATH VOK_MEMPOOL_UP /${CMAKE_INSTALL_LIBDIR}/pkgconfig /)
 configure_file(cmake/vokmempool.pc.in vokmempool.pc @ONLY)
 install(FILES ${CMAKE_CURRENT_BINARY_DIR}/vokmempool.pc

@@ -38,6 +38,8 @@ expect memcheck use-after-clear '0 bytes inside a block of size 10 free.d' 'Mgr:
 expect memcheck leak ' 10 bytes in 1 blocks are definitely lost' \
   ' 5,000 bytes in 1 blocks are definitely lost' 'Leak.*faulty_child.cpp'
 [ "$(grep -c 'definitely lost' "$scratch/err")" -eq 2 ] || { echo "leaks that are none"; failed=1; }
+expect memcheck free-twice-unpooled 'Invalid free' 'FreeTwiceUnpooled'
+expect asan free-twice-unpooled 'attempting double-free' 'FreeTwiceUnpooled'
 # A granule that is open in part has no name of its own there.
 expect asan overrun 'AddressSanitizer: (use-after-poison|unknown-crash)' 'Overrun'
 expect asan long-overrun 'heap-buffer-overflow'

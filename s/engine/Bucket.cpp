@@ -20,7 +20,7 @@ Bucket* Bucket::Create(Group* parent, std::uint32_t bucketSize, std::uint16_t da
   b->recsSize = static_cast<std::uint16_t>(size);
   b->recSize = static_cast<std::uint16_t>(stride);
   b->Carve();
-  if (Observers::Watching()) [[unlikely]]
+  if (Observers::Present()) [[unlikely]]
     b->Announce();
   return b;
 }
@@ -71,7 +71,7 @@ __attribute__((no_sanitize_address)) Bucket* Bucket::FromData(const void* p) {
 
 void Bucket::Destroy(Bucket* b) noexcept {
   if (b == nullptr || b->recSize == 0) return;
-  if (Observers::Watching()) [[unlikely]]
+  if (Observers::Present()) [[unlikely]]
     b->Withdraw();
   b->parent = nullptr;
   b->next1 = b->prev1 = b->next2 = b->prev2 = nullptr;

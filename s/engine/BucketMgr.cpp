@@ -59,18 +59,24 @@ BucketMgr::~BucketMgr() {
 }
 
 VOK_COLD void* BucketMgr::AllocWatched(std::uint32_t size) {
-  const Observers::Quiet quiet;
-  void* const p = AllocByRule(size);
-  if (const Bucket* const bucket = FindBucket(p))
-    Observers::RecordMade(bucket, p, size, bucket->recSize - recHeaderSize);
+  void* const p = Observers::Present() ? AllocSeen(size) : AllocByRule(size);
   if (Trace::IsOn()) Trace::Allocated(this, p, size);
   return p;
 }
 
 VOK_COLD bool BucketMgr::FreeWatched(void* p) {
-  const Observers::Quiet quiet;
   if (Trace::IsOn()) Trace::Freed(this, p);
+  const Observers::Quiet quiet(enabled);
   return FreeByRule(p);
+}
+
+// The checkers are told of an ExtRec where it is made.
+void* BucketMgr::AllocSeen(std::uint32_t size) {
+  const Observers::Quiet quiet(enabled);
+  void* const p = AllocByRule(size);
+  if (const Bucket* const bucket = FindBucket(p))
+    Observers::RecordMade(bucket, p, size, bucket->recSize - recHeaderSize);
+  return p;
 }
 
 VOK_COLD void* BucketMgr::AllocByRule(std::uint32_t size) {

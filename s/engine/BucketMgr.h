@@ -85,6 +85,7 @@ struct BucketMgr {
 
 private:
   void* AllocWatched(std::uint32_t size);
+  void* AllocSeen(std::uint32_t size);
   void* AllocByRule(std::uint32_t size);
   void* AllocExtRec(std::uint32_t size);
   bool FreeWatched(void* p);

@@ -26,6 +26,7 @@ void VokHeaptrackGone(void*) VOK_WEAK("heaptrack_free");
 
 namespace VOK::MemPool::Observers {
 
+bool present = false;
 bool watching = false;
 
 namespace {
@@ -116,13 +117,11 @@ void Gone(void* p) {
 
 void Begin() {
   Memcheck::isThere = Memcheck::Look();
+  present = Memcheck::isThere || AddressSanitizer::IsThere() || Heaptrack::IsThere();
   Update();
 }
 
-void Update() {
-  watching =
-      Settings::trace || Memcheck::isThere || AddressSanitizer::IsThere() || Heaptrack::IsThere();
-}
+void Update() { watching = present || Settings::trace; }
 
 void BlockMade(void* block, std::size_t size) {
   constexpr std::size_t links = 2 * sizeof(void*);

@@ -11,9 +11,13 @@
 
 namespace VOK::MemPool::Observers {
 
+/// A checker is there.
+extern VOK_HIDDEN bool present;
+
 /// Derived: a checker is there, or the trace switch is on.
 extern VOK_HIDDEN bool watching;
 
+inline bool Present() { return present; }
 VOK_HOT bool Watching() { return watching; }
 
 /// Looks for the checkers. Called once, while the library loads, behind the settings.
@@ -41,10 +45,10 @@ void RecordMade(const void* block, void* p, std::size_t size, std::size_t capaci
 void RecordGone(const void* block, void* p, std::size_t capacity);
 
 /// While it lives, memcheck judges nothing that this thread does: for the library's own accesses to
-/// headers, which are marked as nobody's.
+/// headers, which are marked as nobody's. It lives for no call on the heap of a disabled pool.
 class Quiet {
 public:
-  Quiet() : quiet(watching) {
+  explicit Quiet(bool wanted = true) : quiet(wanted && present) {
     if (quiet) [[unlikely]]
       Judge(false);
   }

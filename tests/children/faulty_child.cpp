@@ -55,6 +55,15 @@ void FreeTwice(Mgr& pool) {
   std::cout << pool.Free(p) << pool.Free(p) << pool.Contains(p) << pool.GetSize(p) << '\n';
 }
 
+// With pooling off, a second Free is the heap's to find.
+void FreeTwiceUnpooled(Mgr&) {
+  VOK::MemPool::ZOR_VOK_MEMPOOL_ON(false);
+  Mgr heap("heap");
+  char* const p = Make(heap, 10);
+  heap.Free(p);
+  heap.Free(p);
+}
+
 // All that is allowed, under all eyes.
 void Nothing(Mgr& pool) {
   char* const p = Make(pool, 13);
@@ -80,6 +89,7 @@ const Fault faults[] = {{"overrun", Overrun},
                         {"use-after-clear", UseAfterClear},
                         {"leak", Leak},
                         {"free-twice", FreeTwice},
+                        {"free-twice-unpooled", FreeTwiceUnpooled},
                         {"nothing", Nothing}};
 
 // Leaves nothing of what stood on the stack below the caller.
