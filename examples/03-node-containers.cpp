@@ -40,7 +40,8 @@ struct Bolt final : Pooled<Bolt, Bolts> {
 
 int main() {
   ZOR_VOK_MEMPOOL_ON(true);
-  Mgr nodes("nodes"), shapes("shapes");
+  Mgr nodes("nodes");
+  Mgr shapes("shapes");
 
   // A container takes the pool as its allocator.
   Map<int, double> squareRoots(nodes);

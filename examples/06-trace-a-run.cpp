@@ -6,7 +6,8 @@ int main() {
   using namespace VOK::MemPool;
   ZOR_VOK_MEMPOOL_ON(true);
   ZOR_VOK_MEMPOOL_TRACE(true);
-  Mgr pool("pool"), other("other");
+  Mgr pool("pool");
+  Mgr other("other");
   void* small = pool.Alloc(10);
   void* large = pool.Alloc(2000);
   pool.Alloc(0);

@@ -40,7 +40,7 @@ int main() {
   for (Worker& worker : workers) {
     unsigned taken = 0;
     for (void* record : worker.records)
-      taken += worker.pool.Free(record);
+      if (worker.pool.Free(record)) ++taken;
     std::cout << worker.pool.GetName() << ": " << taken << " records taken back\n";
   }
 }

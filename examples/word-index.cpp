@@ -106,7 +106,8 @@ char Lower(char c) { return 'A' <= c && c <= 'Z' ? static_cast<char>(c - 'A' + '
 /// Adds the words of a file, its runs of ASCII letters in lower case, and returns its bytes.
 std::uint64_t Read(const std::string& path, std::uint32_t file, WordIndex& index) {
   std::ifstream text(path, std::ios::binary);
-  std::string line, word;
+  std::string line;
+  std::string word;
   std::uint64_t bytes = 0;
   for (std::uint32_t number = 1; std::getline(text, line); ++number) {
     bytes += line.size() + (text.eof() ? 0 : 1);
@@ -142,7 +143,7 @@ void Answer(const WordIndex& index, const std::vector<std::string>& words, const
       number = std::distance(places.begin(), places.end());
       for (auto place = std::next(places.begin(), std::max<std::ptrdiff_t>(number - 3, 0));
            place != places.end(); ++place)
-        first = ' ' + names[place->file] + ':' + std::to_string(place->line) + first;
+        first.insert(0, ' ' + names[place->file] + ':' + std::to_string(place->line));
     }
     std::cout << word << when << ": " << number << " places" << first << '\n';
   }
