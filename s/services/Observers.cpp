@@ -40,7 +40,6 @@ enum Request : std::uintptr_t {
   PoolFree = 0x1306,
   ChangeJudging = 0x1801,
   MakeNoAccess = 0x4D430000, // 'M', 'C': of memcheck alone
-  MakeUndefined = 0x4D430001,
   MakeDefined = 0x4D430002,
 };
 
@@ -135,7 +134,7 @@ void BlockMade(void* block, std::size_t size) {
 
 void BlockGone(void* block, std::size_t size) {
   Memcheck::Tell(Memcheck::DestroyPool, block);
-  Memcheck::Tell(Memcheck::MakeUndefined, block, size);
+  Memcheck::Tell(Memcheck::MakeDefined, block, size);
   AddressSanitizer::Unpoison(block, size);
 }
 

@@ -32,7 +32,7 @@ void Update();
 /// leads a leak checker on to the next block, its first two pointers.
 void BlockMade(void* block, std::size_t size);
 
-/// The block goes back to the heap and must bear no mark.
+/// The block returns to the heap next and must bear no mark: its links are still read on the way.
 void BlockGone(void* block, std::size_t size);
 
 /// A record that nobody holds: its data must not be touched.
