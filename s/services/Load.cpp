@@ -35,12 +35,4 @@ const ObserversLife observersLife;
 std::ostream& StandardOutput() { return std::cout; }
 std::ostream& StandardError() { return std::cerr; }
 
-OutputLine::OutputLine() : os(std::cout.rdbuf()) {
-  os.setstate(std::cout.rdstate());
-  os.imbue(std::cout.getloc());
-  os.flags(std::cout.flags());
-  os.fill(std::cout.fill());
-  os.width(std::cout.width(0)); // the next insertion uses it up
-}
-
 } // namespace VOK::MemPool
