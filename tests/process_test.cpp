@@ -350,6 +350,16 @@ TEST(Refusal, IsThrownAsItsTextByALoadAtRunTime) {
     EXPECT_EQ(result.status, 0) << result.command;
   }
 }
+
+// It is mapped, so that a second load starts nothing any more.
+TEST(Refusal, LeavesALibraryThatWorksWhole) {
+  const Env env = {{minSize, "16"}, {maxSize, "16"}, {on, "1"}, {trace, "1"}};
+  const Result result =
+      RunChild(host, {"open " + library, "open " + client, "make", "report"}, env);
+  EXPECT_EQ(Masked(result.out.substr(result.err.size())),
+            "zvpt:c:@1\nzvpt:c:@2\nzvpt:c:@3\nmade __VOK_MEMPOOL_00002\n3 pools, found\n"
+            "zvpt:a:@3:@4:10\nzvpt:f:@3:@4:\nserved\nzvpt:d:@2\nzvpt:d:@1\n");
+}
 #endif
 
 // The statements that stop a process, by the beginning of their text.
