@@ -163,8 +163,7 @@ void BucketMgr::Clear() noexcept {
 
 std::uint32_t BucketMgr::GetNumBuckets() const {
   std::uint32_t sum = 0;
-  for (std::uint32_t i = 0; i < numGroups; ++i)
-    if (groups[i] != nullptr) sum += groups[i]->numBuckets;
+  ForEachGroup(*this, [&](const Group& group, std::uint32_t) { sum += group.numBuckets; });
   return sum;
 }
 
