@@ -4,6 +4,8 @@
 
 #include "services/Trace.h"
 
+#include <cassert>
+
 namespace VOK::MemPool {
 
 std::string Indent(std::uint32_t depth) { return std::string(std::size_t{3} * depth, ' '); }
@@ -68,6 +70,7 @@ Table& Table::Percent(double number) {
 }
 
 Table& Table::Bar(std::uint32_t stars) {
+  NextWidth(); // a bar has the length of its number
   os.width(static_cast<std::streamsize>(stars));
   os.fill('*');
   os << "*";
@@ -80,6 +83,14 @@ Table& Table::Text(const char* text) {
   return *this;
 }
 
-void Table::End() { os << std::endl; }
+void Table::End() {
+  assert(next == columns.size());
+  os << std::endl;
+}
+
+int Table::NextWidth() {
+  assert(next < columns.size());
+  return columns[next++].width;
+}
 
 } // namespace VOK::MemPool
