@@ -53,10 +53,6 @@ void ForEachSetting(Use use) {
     }
 }
 
-bool IsAligned(const void* p, std::size_t alignment) {
-  return reinterpret_cast<std::uintptr_t>(p) % alignment == 0;
-}
-
 TEST(Resource, AlignsEverySize) {
   ForEachSetting([](Mgr& pool) {
     Resource resource(pool);
@@ -64,7 +60,7 @@ TEST(Resource, AlignsEverySize) {
       std::map<std::size_t, unsigned char*> blocks; // by their size
       for (std::size_t size = 0; size < 2000; size += VOK_MEMPOOL_EMULATED ? 7 : 1) {
         auto* const p = static_cast<unsigned char*>(resource.allocate(size, alignment));
-        ASSERT_TRUE(IsAligned(p, alignment)) << size << ' ' << alignment;
+        ASSERT_EQ(reinterpret_cast<std::uintptr_t>(p) % alignment, 0U) << size << ' ' << alignment;
         blocks[size] = std::fill_n(p, size, static_cast<unsigned char>(size)) - size;
       }
       for (const auto& [size, p] : blocks) {
@@ -89,8 +85,7 @@ TEST(Resource, CostsWhatIsDocumented) {
   Resource resource(pool);
   for (const auto& [size, alignment, wide, narrow] : cases) {
     void* const p = resource.allocate(size, alignment);
-    const unsigned taken = pool.GetSize(Detail::Unmarked(p));
-    EXPECT_EQ(taken, sizeof(void*) == 8 ? wide : narrow) << size << ' ' << alignment;
+    EXPECT_EQ(pool.GetSize(Detail::Unmarked(p)), sizeof(void*) == 8 ? wide : narrow) << size;
     EXPECT_EQ(pool.Contains(p), alignment <= 4);
     resource.deallocate(p, size, alignment);
   }
@@ -104,7 +99,7 @@ struct alignas(N) Part {
   unsigned char bytes[N];
 
   Part() {
-    EXPECT_TRUE(IsAligned(this, N));
+    EXPECT_EQ(reinterpret_cast<std::uintptr_t>(this) % N, 0U);
     if (living == limit) throw std::runtime_error("one too many");
     std::fill_n(bytes, N, static_cast<unsigned char>(++living));
   }
@@ -231,11 +226,10 @@ TEST(Adaptors, MakeAndDestroy) {
 TEST(Adaptors, RefuseWhatWouldEndTheProcess) {
   ForEachSetting([](Mgr& pool) {
     constexpr std::size_t limit = 1073741823, most = SIZE_MAX;
-    Resource resource(pool);
     constexpr std::size_t requests[][2] = {
         {limit + 1, 1}, {limit - 7, 32}, {most, 8}, {most - 7, 64}, {1, most / 2 + 1}};
     for (const auto& [size, alignment] : requests)
-      EXPECT_THROW(static_cast<void>(resource.allocate(size, alignment)), std::bad_alloc);
+      EXPECT_THROW(static_cast<void>(Resource(pool).allocate(size, alignment)), std::bad_alloc);
     Allocator<Part<32>> parts(pool);
     EXPECT_EQ(parts.max_size(), (limit - 35) / 32);
     EXPECT_THROW(parts.allocate(limit / 32), std::bad_alloc);
@@ -258,11 +252,10 @@ TEST(Adaptors, CompareAndConvertAsTheStandardsDo) {
   EXPECT_FALSE(Resource(a).is_equal(Resource(b)));
   EXPECT_FALSE(Resource(a).is_equal(*std::pmr::new_delete_resource()));
 
-  using Traits = std::allocator_traits<Allocator<int>>;
-  static_assert(!Traits::is_always_equal::value);
-  static_assert(!Traits::propagate_on_container_copy_assignment::value);
-  static_assert(Traits::propagate_on_container_move_assignment::value);
-  static_assert(Traits::propagate_on_container_swap::value);
+  using A = Allocator<int>;
+  static_assert(!A::is_always_equal::value && !A::propagate_on_container_copy_assignment::value);
+  static_assert(A::propagate_on_container_move_assignment::value);
+  static_assert(A::propagate_on_container_swap::value);
   using D = Bolt<1, true>;
   static_assert(isAsStandard<D, Base<1>> && isAsStandard<Base<1>, D> && isAsStandard<const D, D>);
   static_assert(isAsStandard<D, D[]> && isAsStandard<D[], const D[]> && isAsStandard<D[], D>);

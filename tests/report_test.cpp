@@ -26,7 +26,6 @@
 
 using namespace VOK::MemPool;
 using testing::HasSubstr;
-using testing::Not;
 
 namespace {
 
@@ -52,10 +51,9 @@ protected:
 
   Mgr& Make(const std::string& name, const std::string& settings = "") {
     Set("bucket=4010 align=4 max=1000 min=8 keep=0 on=1 trace=0 " + settings);
-    pools.emplace_back();
+    auto& pool = pools.emplace_back();
     const ArenaHeap::Use use;
-    pools.back().reset(new Mgr(name.c_str()));
-    return *pools.back();
+    return *(pool = std::make_unique<Mgr>(name.c_str()));
   }
 
   static std::vector<void*> Alloc(Mgr& pool, unsigned number, unsigned size) {
@@ -169,10 +167,6 @@ TEST_F(Reports, AllPools) {
   std::memcpy(static_cast<void*>(&disabled), &own, sizeof own);
 }
 
-struct Comma : std::numpunct<char> {
-  char do_decimal_point() const override { return ','; }
-};
-
 // The state under which a report starts is part of its text, and some of it stays behind.
 TEST_F(Reports, StateOfTheStream) {
   const std::pair<const char*, void (*)(std::ostream&)> states[] = {
@@ -183,7 +177,11 @@ TEST_F(Reports, StateOfTheStream) {
       {"boolalpha", [](std::ostream& os) { os << std::boolalpha; }},
       {"showpos", [](std::ostream& os) { os << std::showpos; }},
       {"scientific", [](std::ostream& os) { os << std::scientific << std::setprecision(1); }},
-      {"decimal comma", [](std::ostream& os) { os.imbue(std::locale({}, new Comma)); }},
+      {"grouped digits",
+       [](std::ostream& os) {
+         GroupingLocale groups;
+         os.imbue(std::locale());
+       }},
       {"rounding up", [](std::ostream&) { std::fesetround(FE_UPWARD); }}};
   Alloc(Make("state", "bucket=50 max=16"), 4, 12);
   Make("idle");
@@ -262,11 +260,10 @@ TEST_F(Reports, DamagedBucket) {
 
   // All walks end and stay in the block, which the address sanitizer watches, and write nothing
   // into it. Nothing in a bucket tells how large its block is, so its area only shrinks.
-  std::vector<std::string> places = {"recsSize", "recSize", "freeHead", "freeRecs"};
-  for (unsigned offset = 2; offset < 162; offset += offset % 16 == 2 ? 2 : 14)
-    places.push_back(std::to_string(offset));
-  for (const std::string& place : places)
-    for (unsigned value = 0; value < (place == places[0] ? 162 : 65536);
+  std::istringstream places("recsSize recSize freeHead freeRecs 2 4 18 20 34 36 50 52 66 68 82 84 "
+                            "98 100 114 116 130 132 146 148");
+  for (std::string place; places >> place;)
+    for (unsigned value = 0; value < (place == "recsSize" ? 162 : 65536);
          value += 1 + value / 300 * 99) {
       damage(place + " " + std::to_string(value));
       const std::vector<std::uint8_t> damaged(bytes.begin(), bytes.end());
