@@ -9,11 +9,10 @@
 #include <cstring>
 #include <iostream>
 #include <locale>
+#include <memory>
 #include <new>
-#include <optional>
 #include <sstream>
 #include <string>
-#include <string_view>
 #include <vector>
 
 #ifdef _WIN32
@@ -75,12 +74,9 @@ void UseGroupingLocale(State&) {
 }
 
 #ifndef VOK_MEMPOOL_HOST
-struct StaticPools {
-  Mgr named{"client"};
-  Mgr nameless;
-};
-std::optional<StaticPools> staticPools;
-const bool made = std::getenv("ZOR_STATIC_POOLS") != nullptr && (staticPools.emplace(), true);
+const bool wanted = std::getenv("ZOR_STATIC_POOLS") != nullptr;
+const std::unique_ptr<Mgr> named(wanted ? new Mgr("client") : nullptr);
+const std::unique_ptr<Mgr> nameless(wanted ? new Mgr : nullptr);
 
 void Alloc(State& s) {
   s.blocks.push_back(s.Pool().Alloc(s.Number()));
@@ -103,7 +99,7 @@ void ShowNames(State&) {
 #endif
 
 constexpr struct {
-  std::string_view name;
+  const char* name;
   void (*act)(State& s);
 } operations[] = {
     {"say", [](State& s) { std::cout << s.operand << std::endl; }},
