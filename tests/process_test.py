@@ -198,7 +198,7 @@ def run(calls):
             script += "".join(f"set {key.split('=')[0]}=\n" for key in keys)
         else:
             command = COMMANDS.get(program, f"exec {LAUNCHER} ../{program} {{}}").format(f'"{operations}"')
-            script += f"(export {' '.join(keys)}; {command}) >{i}.out 2>{i}.err\necho $? >{i}.status\n"
+            script += f"(export LC_ALL=C {' '.join(keys)}; {command}) >{i}.out 2>{i}.err\necho $? >{i}.status\n"
     folder = PROGRAMS / "process_calls"
     shutil.rmtree(folder, ignore_errors=True)
     folder.mkdir()
