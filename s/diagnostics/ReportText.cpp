@@ -4,12 +4,6 @@
 
 #include "services/Trace.h"
 
-#include <charconv>
-#include <iterator>
-#include <locale>
-#include <string_view>
-#include <system_error>
-
 namespace VOK::MemPool {
 
 std::string Indent(std::uint32_t depth) { return std::string(std::size_t{3} * depth, ' '); }
@@ -65,20 +59,11 @@ Table& Table::Id(std::uint32_t number) {
   return *this;
 }
 
-// The stream forms a fraction through the C library, which is a third of a row's cost, so the
-// digits are formed here where the stream would write them as they are.
 Table& Table::Percent(double number) {
   os.width(NextWidth() - 1);
   os << std::fixed;
   os.precision(3);
-  char digits[16];
-  const auto end = std::to_chars(digits, std::end(digits), number, std::chars_format::fixed, 3);
-  const bool asTheyAre = end.ec == std::errc() && os.getloc() == std::locale::classic() &&
-                         (os.flags() & std::ios::showpos) == 0;
-  if (asTheyAre)
-    os << std::string_view(digits, end.ptr);
-  else
-    os << number;
+  os << number;
   return Text("% ");
 }
 

@@ -1,10 +1,9 @@
-// The making and the end of a bucket.
+// Construction and destruction of a bucket, and the way back from a pointer.
 // Test: tests/bucket_test.cpp.
 #include "engine/Bucket.h"
 
-#include "services/Observers.h"
+#include "engine/KeepStores.h"
 
-#include <atomic>
 #include <cassert>
 #include <new>
 
@@ -20,8 +19,6 @@ Bucket* Bucket::Create(Group* parent, std::uint32_t bucketSize, std::uint16_t da
   b->recsSize = static_cast<std::uint16_t>(size);
   b->recSize = static_cast<std::uint16_t>(stride);
   b->Carve();
-  if (Observers::Present()) [[unlikely]]
-    b->Announce();
   return b;
 }
 
@@ -41,25 +38,8 @@ void Bucket::Carve() {
   carve(last, 0);
 }
 
-// To the checkers: the block, and that nobody holds its records.
-VOK_COLD void Bucket::Announce() {
-  Observers::BlockMade(this, recsBaseOffset + recsSize);
-  for (std::uint32_t offset = 2; offset < recsSize; offset += recSize)
-    Observers::Vacant(RecAt(offset)->Data(), recSize - recHeaderSize);
-}
-
-// To the checkers: the end of what is still held, and of the block.
-VOK_COLD void Bucket::Withdraw() {
-  for (std::uint32_t offset = 2; offset < recsSize; offset += recSize) {
-    Rec* const rec = RecAt(offset);
-    if (rec->type == RecType::Used)
-      Observers::RecordGone(this, rec->Data(), recSize - recHeaderSize);
-  }
-  Observers::BlockGone(this, recsBaseOffset + recsSize);
-}
-
-// A stray pointer may have a closed record in front of it, which the address sanitizer must not
-// judge in a build with it.
+// A stray pointer may have a poisoned record before it: an instrumented build must not check these
+// reads.
 __attribute__((no_sanitize_address)) Bucket* Bucket::FromData(const void* p) {
   if (p == nullptr) return nullptr;
   const Rec* const rec = Rec::FromData(p);
@@ -71,14 +51,11 @@ __attribute__((no_sanitize_address)) Bucket* Bucket::FromData(const void* p) {
 
 void Bucket::Destroy(Bucket* b) noexcept {
   if (b == nullptr || b->recSize == 0) return;
-  if (Observers::Present()) [[unlikely]]
-    b->Withdraw();
   b->parent = nullptr;
   b->next1 = b->prev1 = b->next2 = b->prev2 = nullptr;
   b->recsSize = 0;
   b->recSize = 0;
-  // The compiler may drop stores to a block that goes back next.
-  std::atomic_signal_fence(std::memory_order_seq_cst);
+  KeepStores(b);
   ::operator delete[](b);
 }
 

@@ -67,7 +67,7 @@ struct Bucket {
   static Bucket* Create(Group* parent, std::uint32_t bucketSize, std::uint16_t dataSize);
 
   /// Scrubs the header, so that a stale pointer into the bucket is not taken for a record, and
-  /// gives the block back. Does nothing for null and for a scrubbed bucket.
+  /// returns the block to the heap. Does nothing for null and for a scrubbed bucket.
   /// REQUIRES: the bucket stands on no list.
   static void Destroy(Bucket* b) noexcept;
 
@@ -114,8 +114,6 @@ private:
   using Recs = vector<const Rec*>;
 
   void Carve();
-  void Announce();
-  void Withdraw();
 
   void DbgHistogram(std::ostream& os, std::uint32_t depth) const;
   void DbgRecs(std::ostream& os, std::uint32_t depth) const;

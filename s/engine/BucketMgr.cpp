@@ -1,30 +1,23 @@
-// The making and the end of a pool, and the ways beside the road of a request: watched calls, first
-// requests of a size class, sizes that the short rule doesn't serve, blocks of the heap.
+// Construction and destruction of a pool, and the slow paths of a request: the first of a size
+// class, a size that the fast index doesn't reach, a block of the heap.
 // Test: tests/bucketmgr_test.cpp.
 #include "engine/BucketMgr.h"
 
 #include "engine/Bucket.h"
 #include "engine/ExtRec.h"
 #include "engine/Group.h"
+#include "engine/KeepStores.h"
+#include "engine/Road.h"
 #include "services/Messages.h"
 #include "services/Observers.h"
 #include "services/Settings.h"
 #include "services/Trace.h"
 
 #include <algorithm>
+#include <memory>
 #include <new>
 
 namespace VOK::MemPool {
-
-namespace {
-
-/// Takes a record that goes back to the heap out of the checkers' sight.
-void Forget(ExtRec* e) {
-  Observers::RecordGone(e, e->Data(), e->length);
-  Observers::BlockGone(e, sizeof(ExtRec) + e->length);
-}
-
-} // namespace
 
 BucketMgr::BucketMgr(Mgr* mgr_, const std::string& name_)
     : name(name_), mgr(mgr_), groups(nullptr), extRecs(nullptr), numGroups(0), numExtRecs(0),
@@ -56,66 +49,31 @@ BucketMgr::~BucketMgr() {
   delete[] groups;
   groups = nullptr;
   numGroups = 0;
+  KeepStores(this);
 }
 
-VOK_COLD void* BucketMgr::AllocWatched(std::uint32_t size) {
-  void* const p = Observers::Present() ? AllocSeen(size) : AllocByRule(size);
-  if (Trace::IsOn()) Trace::Allocated(this, p, size);
-  return p;
-}
-
-VOK_COLD bool BucketMgr::FreeWatched(void* p) {
-  if (Trace::IsOn()) Trace::Freed(this, p);
-  const Observers::Quiet quiet(enabled);
-  return FreeByRule(p);
-}
-
-// The checkers are told of an ExtRec where it is made.
-void* BucketMgr::AllocSeen(std::uint32_t size) {
-  const Observers::Quiet quiet(enabled);
-  void* const p = AllocByRule(size);
-  if (const Bucket* const bucket = FindBucket(p))
-    Observers::RecordMade(bucket, p, size, bucket->recSize - recHeaderSize);
-  return p;
-}
-
-VOK_COLD void* BucketMgr::AllocByRule(std::uint32_t size) {
+VOK_COLD void* BucketMgr::AllocSlow(std::uint32_t size) {
   if (!enabled) return ::operator new[](size);
   const std::uint32_t dataSize = RoundUp(size, dataAlignment);
   if (dataSize + recHeaderSize > maxRecSize) return AllocExtRec(size);
-  const std::uint32_t index = RecSizeIndex(dataSize, minRecSize, dataAlignment);
-  Group*& group = groups[index];
-  if (group == nullptr) {
-    // Several sizes share index 0, and its records must hold the largest of them.
-    const std::uint32_t held =
-        index == 0 ? LargestAtIndex0(minRecSize, maxRecSize, dataAlignment) : dataSize;
-    group = new Group(this, static_cast<std::uint16_t>(held));
-  }
-  return group->Alloc();
+  return GroupFor(dataSize)->Alloc();
 }
 
 VOK_COLD void* BucketMgr::AllocExtRec(std::uint32_t size) {
   ExtRec* const e = ExtRec::Create(size);
   e->Link(extRecs, numExtRecs);
-  Observers::BlockMade(e, sizeof(ExtRec) + size);
-  Observers::RecordMade(e, e->Data(), size, size);
   return e->Data();
 }
 
-VOK_COLD bool BucketMgr::FreeByRule(void* p) {
+VOK_COLD bool BucketMgr::FreeSlow(void* p) {
   if (!enabled) {
     ::operator delete[](p);
     return true;
   }
   if (Bucket* const bucket = FindBucket(p)) return bucket->parent->Free(p, bucket);
-  if (ExtRec* const e = ExtRec::FromData(p)) return FreeExtRec(e);
-  return false;
-}
-
-VOK_COLD bool BucketMgr::FreeExtRec(ExtRec* e) {
-  if (!e->FitsList(extRecs)) return false;
+  ExtRec* const e = FindExtRec(p);
+  if (e == nullptr) return false;
   e->Unlink(extRecs, numExtRecs);
-  Forget(e);
   e->Scrub();
   ExtRec::Destroy(e);
   return true;
@@ -125,10 +83,33 @@ Bucket* BucketMgr::FindBucket(const void* p) const {
   if (!enabled) return nullptr;
   Bucket* const bucket = Bucket::FromData(p);
   if (bucket == nullptr) return nullptr;
-  const std::uint32_t dataSize =
-      RoundUp<std::uint32_t>(bucket->recSize - recHeaderSize, dataAlignment);
+  const std::uint32_t dataSize = bucket->recSize - recHeaderSize;
+  const bool isOurs =
+      FastGroup(dataSize) == bucket->parent || FindGroup(dataSize) == bucket->parent;
+  return isOurs ? bucket : nullptr;
+}
+
+ExtRec* BucketMgr::FindExtRec(void* p) const {
+  ExtRec* const e = ExtRec::FromData(p);
+  return e != nullptr && e->FitsList(extRecs) ? e : nullptr;
+}
+
+Group* BucketMgr::FindGroup(std::uint32_t size) const {
+  const std::uint32_t index = RecSizeIndex(RoundUp(size, dataAlignment), minRecSize, dataAlignment);
+  return index < numGroups ? groups[index] : nullptr;
+}
+
+Group* BucketMgr::GroupFor(std::uint32_t dataSize) {
   const std::uint32_t index = RecSizeIndex(dataSize, minRecSize, dataAlignment);
-  return index < numGroups && groups[index] == bucket->parent ? bucket : nullptr;
+  if (groups[index] == nullptr) {
+    // Several sizes share index 0, and its records must hold the largest of them.
+    const std::uint32_t held =
+        index == 0 ? LargestAtIndex0(minRecSize, maxRecSize, dataAlignment) : dataSize;
+    auto made = std::make_unique<Group>(this, static_cast<std::uint16_t>(held));
+    // A new-handler may have called Alloc and so made one in the meantime.
+    if (groups[index] == nullptr) groups[index] = made.release();
+  }
+  return groups[index];
 }
 
 std::uint32_t BucketMgr::GetSize(const void* p) const {
@@ -145,9 +126,10 @@ bool BucketMgr::Contains(const void* p) const {
 
 void BucketMgr::Clear() noexcept {
   const Observers::Quiet quiet;
+  if (Observers::Present()) [[unlikely]]
+    ReportAllGone();
   for (ExtRec* e = extRecs; e != nullptr;) {
     ExtRec* const next = e->next;
-    Forget(e);
     ExtRec::Destroy(e);
     e = next;
   }
@@ -163,8 +145,7 @@ void BucketMgr::Clear() noexcept {
 
 std::uint32_t BucketMgr::GetNumBuckets() const {
   std::uint32_t sum = 0;
-  for (std::uint32_t i = 0; i < numGroups; ++i)
-    if (groups[i] != nullptr) sum += groups[i]->numBuckets;
+  ForEachGroup(*this, [&sum](const Group& group) { sum += group.numBuckets; });
   return sum;
 }
 

@@ -71,9 +71,24 @@ struct BucketMgr {
   /// Whether `p` is a used record of this pool, or an ExtRec of any.
   bool Contains(const void* p) const;
 
-  /// The bucket of `p` if it is this pool's, else null. With `enabled` false it is null without a
-  /// look in front of `p`, where the bytes are the heap's and can read as anything.
+  /// The bucket of `p` if it is this pool's, else null. With `enabled` false it is null, and no
+  /// byte before `p` is read: those bytes are the heap's.
   Bucket* FindBucket(const void* p) const;
+
+  /// The ExtRec of `p` if it can be on this pool's list, else null.
+  ExtRec* FindExtRec(void* p) const;
+
+  /// The Group that serves `size` bytes by the fast index; null if there is none, or if the fast
+  /// index doesn't reach it.
+  Group* FastGroup(std::uint32_t size) const;
+
+  /// The Group that serves `size` bytes, null if there is none. Costs two divisions.
+  Group* FindGroup(std::uint32_t size) const;
+
+  /// The Group that serves `dataSize` bytes; the first request makes it, and the heap's exception
+  /// passes through.
+  /// REQUIRES: `dataSize` is a multiple of dataAlignment, and its record is within maxRecSize.
+  Group* GroupFor(std::uint32_t dataSize);
 
   /// The number of buckets in all size classes.
   std::uint32_t GetNumBuckets() const;
@@ -84,13 +99,15 @@ struct BucketMgr {
            bool showFreeList) const;
 
 private:
-  void* AllocWatched(std::uint32_t size);
-  void* AllocSeen(std::uint32_t size);
-  void* AllocByRule(std::uint32_t size);
+  void* AllocSlow(std::uint32_t size);
   void* AllocExtRec(std::uint32_t size);
-  bool FreeWatched(void* p);
-  bool FreeByRule(void* p);
-  bool FreeExtRec(ExtRec* e);
+  bool FreeSlow(void* p);
+
+  void* AllocInstrumented(std::uint32_t size);
+  void* AllocReported(std::uint32_t size);
+  bool FreeInstrumented(void* p);
+  bool FreeReported(void* p);
+  void ReportAllGone() const;
 
   void DbgHistogram(std::ostream& os, std::uint32_t depth, const SizeFreqMap& sizes) const;
   void DbgBuckets(std::ostream& os, std::uint32_t depth) const;

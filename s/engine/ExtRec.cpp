@@ -2,7 +2,8 @@
 // Test: tests/bucketmgr_test.cpp.
 #include "engine/ExtRec.h"
 
-#include <atomic>
+#include "engine/KeepStores.h"
+
 #include <new>
 
 namespace VOK::MemPool {
@@ -47,8 +48,7 @@ void ExtRec::Unlink(ExtRec*& head, std::uint32_t& count) {
 
 void ExtRec::Scrub() {
   *this = {};
-  // The compiler may drop stores to a block that goes back next.
-  std::atomic_signal_fence(std::memory_order_seq_cst);
+  KeepStores(this);
 }
 
 } // namespace VOK::MemPool

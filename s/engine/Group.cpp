@@ -1,28 +1,35 @@
-// The making and releasing of buckets and the two lists: what stands beside the road of a request.
+// Construction and release of buckets, and the two lists: the slow paths of a Group.
 // Test: tests/group_test.cpp.
 #include "engine/Group.h"
 
-#include "services/Observers.h"
-
 #include <cassert>
+#include <memory>
 
 namespace VOK::MemPool {
+
+namespace {
+
+struct DestroyBucket {
+  void operator()(Bucket* b) const noexcept { Bucket::Destroy(b); }
+};
+
+} // namespace
 
 Group::Group(BucketMgr* owner_, std::uint16_t dataSize_)
     : owner(owner_), dataSize(dataSize_),
       totalRecs(
           static_cast<std::uint16_t>((owner_->bucketSize - 2) / (dataSize_ + recHeaderSize))) {}
 
+// Out of memory, the heap runs the program's new-handler, which may clear the pool and with it
+// destroy this Group: the way goes on in the Group that the pool has afterwards.
 VOK_COLD void* Group::AllocFromNewBucket() {
-  Bucket* const b = Bucket::Create(this, owner->bucketSize, dataSize);
-  assert(b->freeRecs == totalRecs);
-  ++numBuckets;
-  b->next1 = head1;
-  if (head1 != nullptr) head1->prev1 = b;
-  head1 = b;
-  if (tail1 == nullptr) tail1 = b;
-  LinkFree(b);
-  return Alloc();
+  BucketMgr* const pool = owner;
+  const std::uint16_t size = dataSize;
+  std::unique_ptr<Bucket, DestroyBucket> b(Bucket::Create(this, pool->bucketSize, size));
+  Group* const group = pool->GroupFor(size);
+  b->parent = group;
+  group->Link(b.release());
+  return group->Alloc();
 }
 
 VOK_COLD void* Group::UnlinkFull(Bucket* b, void* p) {
@@ -52,7 +59,6 @@ bool Group::Free(void* p, Bucket* bucket) {
   if (bucket == nullptr || bucket->parent != this) return false;
   // In numbers, since the compiler may take it for granted that no difference of a pointer is null.
   if (reinterpret_cast<std::uintptr_t>(p) <= sizeof(Rec)) return false;
-  Observers::RecordGone(bucket, p, bucket->recSize - recHeaderSize);
   return TakeBack(p, bucket);
 }
 
@@ -64,6 +70,16 @@ void Group::Clear() noexcept {
   }
   head1 = head2 = nullptr;
   numBuckets = numFreeBuckets = 0;
+}
+
+void Group::Link(Bucket* b) {
+  assert(b->freeRecs == totalRecs);
+  ++numBuckets;
+  b->next1 = head1;
+  if (head1 != nullptr) head1->prev1 = b;
+  head1 = b;
+  if (tail1 == nullptr) tail1 = b;
+  LinkFree(b);
 }
 
 void Group::LinkFree(Bucket* b) {

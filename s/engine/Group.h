@@ -1,5 +1,5 @@
 // One size class of one pool: its buckets on two lists, all of them and those with a free record.
-// It decides which bucket serves, when one is made and when one goes back to the heap.
+// It decides which bucket serves, when one is made and when one returns to the heap.
 // Test: tests/group_test.cpp.
 #ifndef VOK_MEMPOOL_GROUP_H
 #define VOK_MEMPOOL_GROUP_H
@@ -32,9 +32,9 @@ struct Group {
   /// The data pointer of a used record, never null; the heap's exception passes through.
   void* Alloc();
 
-  /// Takes back the record of data pointer `p`. `bucket` is the one that holds it, or null to have
-  /// it looked up. False, with nothing changed, if `p` is not in use or the bucket not this
-  /// Group's.
+  /// Frees the record of data pointer `p`. `bucket` is the one that holds it, or null to have it
+  /// looked up. False, with nothing changed, if the look-up finds none or the bucket is not this
+  /// Group's. REQUIRES, where `bucket` is given: `p` is a used record of it.
   bool Free(void* p, Bucket* bucket);
 
   /// Free, for a caller that has made its tests. Always true.
@@ -56,10 +56,18 @@ struct Group {
 
 private:
   void* AllocFromNewBucket();
+  void Link(Bucket* b);
   void* UnlinkFull(Bucket* b, void* p);
   bool LinkRefilled(Bucket* b);
   bool ReleaseEmptied(Bucket* b);
 };
+
+/// Calls `visit` with each Group of `pool`, in the order of the table.
+template <class Visit>
+void ForEachGroup(const BucketMgr& pool, Visit visit) {
+  for (std::uint32_t i = 0; i < pool.numGroups; ++i)
+    if (Group* const group = pool.groups[i]) visit(*group);
+}
 
 static_assert(sizeof(Group) <= 4 * sizeof(void*) + 2 * 4 + 2 * 2 + (sizeof(void*) - 4),
               "the count of records fills what alignment leaves");

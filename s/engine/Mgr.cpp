@@ -4,6 +4,7 @@
 
 #include "engine/BucketMgr.h"
 #include "engine/Invariants.h"
+#include "engine/KeepStores.h"
 #include "engine/Road.h"
 #include "services/Messages.h"
 #include "services/MgrRegistry.h"
@@ -37,6 +38,7 @@ Mgr::~Mgr() {
   MgrRegistry::Remove(bucketMgr->name);
   delete bucketMgr;
   bucketMgr = nullptr;
+  KeepStores(this);
 }
 
 // Private, so that no caller copies a handle.

@@ -1,6 +1,6 @@
 // A record's header: 4 bytes in front of the data that the caller holds. In a free record they
 // chain the free list, in a used one they lead back to the bucket. A record has no alignment
-// beyond what its size gives it, so the header is read and written one byte at a time.
+// beyond what its size gives it, so the header is declared in bytes, low byte first everywhere.
 // Test: tests/bucket_test.cpp.
 #ifndef VOK_MEMPOOL_REC_H
 #define VOK_MEMPOOL_REC_H
@@ -40,8 +40,9 @@ struct Rec {
 
   VOK_HOT void* Data() { return this + 1; }
 
-  /// The one pair that touches the 16-bit number. Both compile to one access, the writer only in
-  /// this form: left as two stores, g++ keeps them apart in Bucket::PushRec.
+  /// The one pair that accesses the 16-bit number. Each compiles to one access of two bytes on a
+  /// little-endian machine; the writer only in this form, since g++ keeps two stores apart in
+  /// Bucket::PushRec.
   VOK_HOT std::uint16_t Offset() const {
     return static_cast<std::uint16_t>(offsetLow | offsetHigh << 8);
   }

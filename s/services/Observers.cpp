@@ -4,9 +4,7 @@
 // Test: tests/process_test.py.
 #include "services/Observers.h"
 
-#include "services/Settings.h"
-
-#include <cstdint>
+#include <atomic>
 
 // Named by what they mean here; what the linker looks for stands beside.
 #ifdef _WIN32
@@ -27,7 +25,7 @@ void VokHeaptrackGone(void*) VOK_WEAK("heaptrack_free");
 namespace VOK::MemPool::Observers {
 
 bool present = false;
-bool watching = false;
+std::uint8_t watching = 0;
 
 namespace {
 
@@ -40,7 +38,6 @@ enum Request : std::uintptr_t {
   PoolFree = 0x1306,
   ChangeJudging = 0x1801,
   MakeNoAccess = 0x4D430000, // 'M', 'C': of memcheck alone
-  MakeUndefined = 0x4D430001,
   MakeDefined = 0x4D430002,
 };
 
@@ -118,10 +115,18 @@ void Gone(void* p) {
 void Begin() {
   Memcheck::isThere = Memcheck::Look();
   present = Memcheck::isThere || AddressSanitizer::IsThere() || Heaptrack::IsThere();
-  Update();
+  SetTracing(IsTracing());
 }
 
-void Update() { watching = present || Settings::trace; }
+bool IsTracing() {
+  return (std::atomic_ref(watching).load(std::memory_order_relaxed) & watchingTrace) != 0;
+}
+
+// One store of the whole byte: the other bit doesn't change after the load.
+void SetTracing(bool on) {
+  const int bits = (on ? watchingTrace : 0) | (present ? watchingChecker : 0);
+  std::atomic_ref(watching).store(static_cast<std::uint8_t>(bits), std::memory_order_relaxed);
+}
 
 void BlockMade(void* block, std::size_t size) {
   constexpr std::size_t links = 2 * sizeof(void*);
@@ -135,7 +140,7 @@ void BlockMade(void* block, std::size_t size) {
 
 void BlockGone(void* block, std::size_t size) {
   Memcheck::Tell(Memcheck::DestroyPool, block);
-  Memcheck::Tell(Memcheck::MakeUndefined, block, size);
+  Memcheck::Tell(Memcheck::MakeDefined, block, size);
   AddressSanitizer::Unpoison(block, size);
 }
 

@@ -115,7 +115,11 @@ void* ArenaHeap::Take(std::size_t size, Form form) {
   if (fails && failLater) failIn = 1;
   if (fails || size >= left || room + guard > left) {
     events.push_back({'!', form, size, nullptr});
-    throw std::bad_alloc();
+    const std::new_handler handler = std::get_new_handler();
+    if (handler == nullptr) throw std::bad_alloc();
+    const Use again;
+    handler();
+    return Take(size, form);
   }
   std::vector<std::byte*>& sameRoom = spare[room];
   std::byte* p = end;

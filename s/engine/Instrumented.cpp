@@ -1,0 +1,89 @@
+// The operations of a pool while trace is on or a memory-checking tool is present. The tools learn
+// of blocks and records here and nowhere else, so that buckets, Groups and ExtRecs know of none.
+// Test: tests/trace_test.cpp, tests/process_test.py.
+#include "engine/Bucket.h"
+#include "engine/BucketMgr.h"
+#include "engine/ExtRec.h"
+#include "engine/Group.h"
+#include "services/Observers.h"
+#include "services/Trace.h"
+
+#include <cstdint>
+
+namespace VOK::MemPool {
+
+namespace {
+
+void ReportMade(Bucket* b) {
+  Observers::BlockMade(b, recsBaseOffset + b->recsSize);
+  for (std::uint32_t offset = 2; offset < b->recsSize; offset += b->recSize)
+    Observers::Vacant(b->RecAt(offset)->Data(), b->recSize - recHeaderSize);
+}
+
+void ReportGone(Bucket* b) { Observers::BlockGone(b, recsBaseOffset + b->recsSize); }
+
+void ReportGone(ExtRec* e) {
+  Observers::RecordGone(e, e->Data(), e->length);
+  Observers::BlockGone(e, sizeof(ExtRec) + e->length);
+}
+
+void ReportRecordGone(Bucket* b, void* p) {
+  Observers::RecordGone(b, p, b->recSize - recHeaderSize);
+}
+
+} // namespace
+
+VOK_COLD void* BucketMgr::AllocInstrumented(std::uint32_t size) {
+  void* const p = enabled && Observers::Present() ? AllocReported(size) : AllocSlow(size);
+  if (Trace::IsOn()) Trace::Allocated(this, p, size);
+  return p;
+}
+
+VOK_COLD bool BucketMgr::FreeInstrumented(void* p) {
+  if (Trace::IsOn()) Trace::Freed(this, p);
+  return enabled && Observers::Present() ? FreeReported(p) : FreeSlow(p);
+}
+
+// A record comes from a new bucket exactly where its Group has no free one.
+void* BucketMgr::AllocReported(std::uint32_t size) {
+  const Observers::Quiet quiet;
+  const Group* const group = FindGroup(size);
+  const bool makesBucket = group == nullptr || group->head2 == nullptr;
+  void* const p = AllocSlow(size);
+  if (Bucket* const bucket = FindBucket(p)) {
+    if (makesBucket) ReportMade(bucket);
+    Observers::RecordMade(bucket, p, size, bucket->recSize - recHeaderSize);
+  } else {
+    auto* const e = static_cast<ExtRec*>(p) - 1;
+    Observers::BlockMade(e, sizeof(ExtRec) + size);
+    Observers::RecordMade(e, p, size, size);
+  }
+  return p;
+}
+
+// The tools come first: what is freed can be another thread's right after.
+bool BucketMgr::FreeReported(void* p) {
+  const Observers::Quiet quiet;
+  if (Bucket* const bucket = FindBucket(p)) {
+    ReportRecordGone(bucket, p);
+    if (bucket->freeRecs + 1u == bucket->TotalRecs() && !keepEmptyBuckets) ReportGone(bucket);
+  } else if (ExtRec* const e = FindExtRec(p)) {
+    ReportGone(e);
+  }
+  return FreeSlow(p);
+}
+
+VOK_COLD void BucketMgr::ReportAllGone() const {
+  for (ExtRec* e = extRecs; e != nullptr; e = e->next)
+    ReportGone(e);
+  ForEachGroup(*this, [](Group& group) {
+    for (Bucket* b = group.head1; b != nullptr; b = b->next1) {
+      for (std::uint32_t offset = 2; offset < b->recsSize; offset += b->recSize)
+        if (Rec* const rec = b->RecAt(offset); rec->type == RecType::Used)
+          ReportRecordGone(b, rec->Data());
+      ReportGone(b);
+    }
+  });
+}
+
+} // namespace VOK::MemPool
