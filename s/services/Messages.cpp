@@ -1,5 +1,5 @@
 // Every line of the library that is neither trace nor report is formed here.
-// Test: tests/process_test.cpp.
+// Test: tests/process_test.py.
 #include "services/Messages.h"
 
 #include "services/OutputLine.h"

@@ -1,7 +1,7 @@
 // What each checker is told, in its own words. None is a dependency: memcheck is reached by a
 // sequence of instructions that means nothing outside of it, the others by names that stay null
 // where nobody defines them.
-// Test: tests/observer_test.sh.
+// Test: tests/process_test.py.
 #include "services/Observers.h"
 
 #include <atomic>

@@ -1,7 +1,7 @@
 // The checkers that may watch a process: memcheck, the address sanitizer, heaptrack. One library
 // serves all of them without a rebuild: it looks at load which are there, and tells them of each
 // block and record. Trace shares a byte with them, all that the fast path of a request tests.
-// Test: tests/observer_test.sh.
+// Test: tests/process_test.py.
 #ifndef VOK_MEMPOOL_OBSERVERS_H
 #define VOK_MEMPOOL_OBSERVERS_H
 
