@@ -33,38 +33,33 @@ struct Pool {
     mgr.Free(held.back());
     held.pop_back();
   }
-
-  /// A record of another pool, and one a second time while its bucket stands.
-  void Misuse(void* foreign) {
-    mgr.Free(foreign);
-    if (!ZOR_VOK_MEMPOOL_KEEP_EMPTY_BUCKETS()) return;
-    void* const twice = mgr.Alloc(1);
-    mgr.Free(twice);
-    mgr.Free(twice);
-  }
-
-  /// The requests around it are likely to get one address, which proves the Clear.
-  void Clear() {
-    Alloc(1);
-    mgr.Clear();
-    held.clear();
-    Alloc(1);
-  }
 };
 
 } // namespace
 
 int main(int, char** argv) {
   engine.seed(static_cast<unsigned>(std::atoi(argv[1])));
-  const int steps = std::atoi(argv[2]);
-  const int clears = std::atoi(argv[3]);
+  const auto steps = static_cast<unsigned>(std::atoi(argv[2]));
+  const auto clears = static_cast<unsigned>(std::atoi(argv[3]));
   Pool pools[] = {Pool(argv[4]), Pool(argv[5])};
+  Pool& first = pools[0];
   void* const foreign = pools[1].mgr.Alloc(1);
-  for (int i = 1; i <= steps; ++i) {
+  for (unsigned i = 1; i <= steps; ++i) {
     pools[Below(2)].Step();
-    if (pools[0].mgr.IsEnabled()) { // the heap takes no misuse
-      if (Below(20) == 0) pools[0].Misuse(foreign);
-      if (static_cast<int>(Below(static_cast<unsigned>(steps))) < clears) pools[0].Clear();
+    if (first.mgr.IsEnabled()) { // the heap takes no misuse
+      if (Below(20) == 0) first.mgr.Free(foreign);
+      if (Below(20) == 0 && ZOR_VOK_MEMPOOL_KEEP_EMPTY_BUCKETS()) {
+        first.Alloc(1); // given back twice while its bucket stands
+        first.mgr.Free(first.held.back());
+        first.mgr.Free(first.held.back());
+        first.held.pop_back();
+      }
+      if (Below(steps) < clears) { // proved where both requests get one address
+        first.Alloc(1);
+        first.mgr.Clear();
+        first.held.clear();
+        first.Alloc(1);
+      }
     }
     if (i == steps / 2 || i == steps) DbgDetailed();
   }
