@@ -133,6 +133,7 @@ CHANGES = [
     (" 25.000%", "25.0000%", "line 40: expected a number with three decimals at the right of 7"),
     (" 25.000%", "  25.00%", "line 40: expected a number with three decimals at the right of 7"),
     ("+---------+\n", "+\n", "line 103: expected a rule over 8 boxes"),
+    ("| FREE    | \n", "| FREE    | FREE    | \n", "line 104: expected the end of the line"),
     ("#002\n", "#02\n", "expected a number filled with zeros to 3 columns in column 21"),
     ("#002\n", "#0002\n", "expected a number filled with zeros to 3 columns in column 21"),
     ("Next1       :        0", "Next1       :      0x0", "expected an address at the right of 8"),
