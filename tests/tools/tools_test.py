@@ -356,11 +356,14 @@ def test_trace():
                                                                  expected["standingPools"])]
         for key in expected:
             same(found[key], expected[key], f"seed {seed}: {key}")
+        massif = Path("massif").read_text()
         samples = [(int(time), int(held)) for time, held in re.findall(
-            "^time=(\\d+)\nmem_heap_B=(\\d+)$", Path("massif").read_text(), re.M)]
+            "^time=(\\d+)\nmem_heap_B=(\\d+)$", massif, re.M)]
         same(samples, [(time, course[time]) for time in sorted(dict(samples))], "samples")
         same((min(len(course), 50) <= len(samples) <= 102, samples[-1][0]), (True, len(course) - 1),
              f"{len(samples)} samples")
+        at_peak = map(int, re.findall("^ n0: (\\d+) pool ", massif, re.M))
+        same(sum(at_peak), max(course), f"seed {seed}: what the pools hold at the peak")
 
 
 with tempfile.TemporaryDirectory() as folder:
