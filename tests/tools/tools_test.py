@@ -362,8 +362,8 @@ def test_trace():
         same(samples, [(time, course[time]) for time in sorted(dict(samples))], "samples")
         same((min(len(course), 50) <= len(samples) <= 102, samples[-1][0]), (True, len(course) - 1),
              f"{len(samples)} samples")
-        at_peak = map(int, re.findall("^ n0: (\\d+) pool ", massif, re.M))
-        same(sum(at_peak), max(course), f"seed {seed}: what the pools hold at the peak")
+        at_peak = sum(map(int, re.findall("^ n0: (\\d+) pool ", massif, re.M)))
+        same((at_peak, max(dict(samples).values())), (max(course), max(course)), "the peak")
 
 
 with tempfile.TemporaryDirectory() as folder:
