@@ -148,7 +148,7 @@ TEST(Report, FormsAFractionAsTheStreamDoes) {
 }
 
 TEST(Threads, SwitchTraceAndItsLinesTogether) {
-  std::barrier both(2);
+  std::barrier<> both(2);
   int numApart = 0;
   const auto work = [&](bool on) {
     for (int i = 0; i < 20000; ++i) {

@@ -119,13 +119,15 @@ void Begin() {
 }
 
 bool IsTracing() {
-  return (std::atomic_ref(watching).load(std::memory_order_relaxed) & watchingTrace) != 0;
+  return (std::atomic_ref<std::uint8_t>(watching).load(std::memory_order_relaxed) &
+          watchingTrace) != 0;
 }
 
 // One store of the whole byte: the other bit doesn't change after the load.
 void SetTracing(bool on) {
   const int bits = (on ? watchingTrace : 0) | (present ? watchingChecker : 0);
-  std::atomic_ref(watching).store(static_cast<std::uint8_t>(bits), std::memory_order_relaxed);
+  std::atomic_ref<std::uint8_t>(watching).store(static_cast<std::uint8_t>(bits),
+                                                std::memory_order_relaxed);
 }
 
 void BlockMade(void* block, std::size_t size) {
