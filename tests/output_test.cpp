@@ -9,7 +9,6 @@
 #include "services/Trace.h"
 
 #include <barrier>
-#include <cfenv>
 #include <gmock/gmock.h>
 #include <iomanip>
 #include <iostream>
@@ -125,28 +124,6 @@ TEST(OutputLine, HidesNoLoadFailure) {
   }
 }
 
-void UseBucketsOfThree() {
-  ZOR_VOK_MEMPOOL_ON(true);
-  ZOR_VOK_MEMPOOL_BUCKET_SIZE(26);
-  ZOR_VOK_MEMPOOL_MAX_RECORD_SIZE(8);
-}
-
-TEST(Report, FormsAFractionAsTheStreamDoes) {
-  UseBucketsOfThree();
-  Mgr pool;
-  pool.Alloc(4);
-  for (const int mode : {FE_TONEAREST, FE_UPWARD}) {
-    std::fesetround(mode);
-    std::ostringstream report;
-    std::ostringstream expected;
-    pool.GetBucketMgr()->Dbg(report, 0, false, false, false);
-    const volatile double hundred = 100;
-    expected << std::fixed << std::setprecision(3) << hundred / 3 << "% ";
-    std::fesetround(FE_TONEAREST);
-    EXPECT_THAT(report.str(), testing::HasSubstr(expected.str()));
-  }
-}
-
 TEST(Threads, SwitchTraceAndItsLinesTogether) {
   std::barrier<> both(2);
   int numApart = 0;
@@ -166,7 +143,9 @@ TEST(Threads, SwitchTraceAndItsLinesTogether) {
 }
 
 TEST(Threads, WriteWholeLinesWithAPoolEach) {
-  UseBucketsOfThree();
+  ZOR_VOK_MEMPOOL_ON(true);
+  ZOR_VOK_MEMPOOL_BUCKET_SIZE(26); // three records
+  ZOR_VOK_MEMPOOL_MAX_RECORD_SIZE(8);
   ZOR_VOK_MEMPOOL_TRACE(true);
   const auto work = [](Mgr& pool) {
     for (int i = 0; i < 100; ++i) {

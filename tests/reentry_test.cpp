@@ -16,84 +16,66 @@ using namespace VOK::MemPool;
 
 namespace {
 
-Mgr* pool;
-std::vector<void*> held;
-unsigned numRuns;
+// What a new-handler does, one step after the other: a call on the whole pool, or a request of
+// that many bytes. Each plan leaves Groups and buckets other than those that Alloc saw.
+enum Step { clear = -2, freeAll = -1 };
+const std::vector<int> plans[] = {{clear}, {freeAll}, {4, 8, 100, 4, 4}, {clear, 8, 4}};
 
-void Take(unsigned size) {
-  void* const p = std::memset(pool->Alloc(size), 0xA5, size);
-  const ArenaHeap::Use real(false);
-  held.push_back(p);
-}
+struct Reentered {
+  Mgr mgr;
+  std::vector<void*> held;
 
-void FreeAll() {
-  for (void* const p : held)
-    EXPECT_TRUE(pool->Contains(p) && pool->GetSize(p) >= 4 && pool->Free(p));
-  held.clear();
-}
-
-void ClearAll() {
-  pool->Clear();
-  held.clear();
-}
-
-// The new-handlers: each leaves Groups and buckets other than those that Alloc saw.
-const std::new_handler handlers[] = {
-    [] {
-      ++numRuns;
-      ClearAll();
-    },
-    [] {
-      ++numRuns;
-      FreeAll();
-    },
-    [] {
-      ++numRuns;
-      for (const unsigned size : {4u, 8u, 100u, 4u, 4u})
-        Take(size);
-    },
-    [] {
-      ++numRuns;
-      ClearAll();
-      Take(8);
-      Take(4);
-    },
+  void Do(int step) {
+    void* const p =
+        step >= 0 ? std::memset(mgr.Alloc(unsigned(step)), 0xA5, unsigned(step)) : nullptr;
+    const ArenaHeap::Use real(false);
+    if (p != nullptr) return held.push_back(p);
+    if (step == clear) mgr.Clear();
+    for (void* const h : held)
+      EXPECT_TRUE(step == clear || (mgr.Contains(h) && mgr.GetSize(h) >= 4 && mgr.Free(h)));
+    held.clear();
+  }
 };
 
+Reentered* pool;
+const std::vector<int>* plan;
+int numRuns = 0;
+
 TEST(NewHandler, MayUseThePoolThatIsOutOfMemory) {
-  const bool on = ZOR_VOK_MEMPOOL_ON();
-  const unsigned bucketSize = ZOR_VOK_MEMPOOL_BUCKET_SIZE(),
-                 max = ZOR_VOK_MEMPOOL_MAX_RECORD_SIZE();
   ZOR_VOK_MEMPOOL_ON(true);
   ZOR_VOK_MEMPOOL_BUCKET_SIZE(26); // two records of 4 bytes, one of 8
   ZOR_VOK_MEMPOOL_MAX_RECORD_SIZE(16);
-  numRuns = 0;
-  for (const std::new_handler handler : handlers)
-    for (const unsigned numBefore : {0u, 2u, 4u})
-      for (const unsigned size : {4u, 8u, 100u})
+  for (const std::vector<int>& steps : plans)
+    for (const int numBefore : {0, 2, 4})
+      for (const int size : {4, 8, 100})
         for (const unsigned call : {1u, 2u, 3u}) {
           SCOPED_TRACE(testing::Message()
                        << numBefore << " before, size " << size << ", failing " << call);
           ArenaHeap heap;
           const ArenaHeap::Use use;
-          Mgr mgr("reentered");
-          pool = &mgr;
-          for (unsigned i = 0; i < numBefore; ++i)
-            Take(4);
-          std::set_new_handler(handler);
+          Reentered reentered;
+          pool = &reentered;
+          plan = &steps;
+          for (int i = 0; i < numBefore; ++i)
+            pool->Do(4);
           heap.FailAt(call);
-          Take(size);
-          heap.FailAt(0);
+          std::set_new_handler([] {
+            ++numRuns;
+            for (const int step : *plan)
+              pool->Do(step);
+          });
+          pool->Do(size);
           std::set_new_handler(nullptr);
-          EXPECT_TRUE(IsValid(*mgr.GetBucketMgr()));
-          FreeAll();
-          EXPECT_EQ(mgr.GetBucketMgr()->GetNumBuckets(), 0u);
+          heap.FailAt(0);
+          EXPECT_TRUE(IsValid(*pool->mgr.GetBucketMgr()));
+          pool->Do(freeAll);
+          EXPECT_EQ(pool->mgr.GetBucketMgr()->GetNumBuckets(), 0u);
           EXPECT_EQ(heap.faults, std::vector<std::string>());
         }
-  EXPECT_GE(numRuns, 36u);
-  ZOR_VOK_MEMPOOL_ON(on);
-  ZOR_VOK_MEMPOOL_BUCKET_SIZE(bucketSize);
-  ZOR_VOK_MEMPOOL_MAX_RECORD_SIZE(max);
+  EXPECT_GE(numRuns, 36);
+  ZOR_VOK_MEMPOOL_ON(false);
+  ZOR_VOK_MEMPOOL_BUCKET_SIZE(4010);
+  ZOR_VOK_MEMPOOL_MAX_RECORD_SIZE(1000);
 }
 
 TEST(Handle, DestroyedTwiceIsDestroyedOnce) {
