@@ -1,6 +1,6 @@
 // The seven process-wide settings. A pool copies them when it is built; the trace switch alone is
 // read at each event. They are plain variables with no lock, and have no end of their own.
-// Test: tests/settings_test.cpp, tests/process_test.cpp.
+// Test: tests/model_test.cpp, tests/process_test.cpp.
 #ifndef VOK_MEMPOOL_SETTINGS_H
 #define VOK_MEMPOOL_SETTINGS_H
 

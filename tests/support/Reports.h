@@ -3,7 +3,8 @@
 #ifndef VOK_MEMPOOL_TESTS_REPORTS_H
 #define VOK_MEMPOOL_TESTS_REPORTS_H
 
-#include "support/Script.h"
+#include "support/ArenaHeap.h"
+#include "support/Process.h"
 
 #include "services/Observers.h"
 
@@ -17,7 +18,7 @@ class Reports : public testing::Test {
 protected:
   ArenaHeap heap;
   KeepSettings settings;
-  CaughtOutput output{[] {}};
+  CaughtOutput output;
   const VOK::MemPool::Observers::Quiet looking; // into each byte of the arena
 
   void SetUp() override;
