@@ -52,18 +52,13 @@ void* Map(void* place, std::size_t size) {
 #endif
 }
 
-std::byte* MapArena() {
-  void* const place = Map(reinterpret_cast<void*>(arenaPlace), arenaSize);
+std::byte* Arena() {
+  static void* const place = Map(reinterpret_cast<void*>(arenaPlace), arenaSize);
   if (reinterpret_cast<std::uintptr_t>(place) != arenaPlace) {
-    std::fputs("ArenaHeap: the arena's place is taken\n", stderr);
+    std::fputs("ArenaHeap: the arena's place is in use\n", stderr);
     std::abort();
   }
   return static_cast<std::byte*>(place);
-}
-
-std::byte* Arena() {
-  static std::byte* const arena = MapArena();
-  return arena;
 }
 
 // So that a block's last granule of 16 and the guard after it are always ours.
@@ -108,8 +103,6 @@ ArenaHeap::~ArenaHeap() { heap = nullptr; }
 ArenaHeap::Use::Use(bool arena) : before(inUse) { inUse = arena; }
 ArenaHeap::Use::~Use() { inUse = before; }
 
-void ArenaHeap::FailAt(unsigned k) { failIn = k; }
-
 void* ArenaHeap::Take(std::size_t size, Form form) {
   const Use real(false);
   const auto left = static_cast<std::size_t>(Arena() + arenaSize - end);
@@ -144,10 +137,10 @@ void ArenaHeap::GiveBack(void* block, Form form, const std::size_t* size) {
   const Use real(false);
   auto* const p = static_cast<std::byte*>(block);
   const auto found = live.find(p);
-  if (found == live.end()) return Fault("no block is released", p, {form, 0});
+  if (found == live.end()) return Fault("no block is released", 0);
   const Block known = found->second;
-  if (known.form != form) Fault("released in the wrong form", p, known);
-  if (size != nullptr && *size != known.size) Fault("released in the wrong size", p, known);
+  if (known.form != form) Fault("released in the wrong form", known.size);
+  if (size != nullptr && *size != known.size) Fault("released in the wrong size", known.size);
   CheckGuards(p, known);
   const auto* const bytes = static_cast<const std::uint8_t*>(block);
   events.push_back({'-', form, known.size, p, {bytes, bytes + known.size}});
@@ -160,16 +153,9 @@ void ArenaHeap::GiveBack(void* block, Form form, const std::size_t* size) {
 const std::vector<std::string>& ArenaHeap::Finish() {
   for (const auto& [p, block] : live) {
     CheckGuards(p, block);
-    Fault("not released", p, block);
+    Fault("not released", block.size);
   }
   return faults;
-}
-
-void ArenaHeap::Fault(const char* what, const void* p, const Block& block) {
-  char text[100];
-  std::snprintf(text, sizeof text, "%s: %p, %s form, %zu bytes", what, p,
-                block.form == Form::Array ? "array" : "plain", block.size);
-  faults.emplace_back(text);
 }
 
 void ArenaHeap::CheckGuards(std::byte* p, const Block& block) {
@@ -179,7 +165,7 @@ void ArenaHeap::CheckGuards(std::byte* p, const Block& block) {
   ForGuards(p, block.size, [&](std::byte byte, std::byte wanted) { isWhole &= byte == wanted; });
   Close(p - guard, whole);
   Open(p, block.size);
-  if (!isWhole) Fault("written beyond its bounds", p, block);
+  if (!isWhole) Fault("written beyond its bounds", block.size);
 }
 
 // The library uses no other form; of those, the standard library uses one.

@@ -42,15 +42,13 @@ public:
   public:
     explicit Use(bool arena = true);
     ~Use();
-    Use(const Use&) = delete;
-    Use& operator=(const Use&) = delete;
 
   private:
     const bool before;
   };
 
   /// The `k`-th allocation from now throws bad_alloc, with a `k` of 0 none does.
-  void FailAt(unsigned k);
+  void FailAt(unsigned k) { failIn = k; }
 
   /// Adds the live blocks to the faults, and returns all of them.
   const std::vector<std::string>& Finish();
@@ -67,7 +65,9 @@ private:
     std::size_t size;
   };
 
-  void Fault(const char* what, const void* p, const Block& block);
+  void Fault(const std::string& what, std::size_t size) {
+    faults.push_back(what + ": a block of " + std::to_string(size) + " bytes");
+  }
   void CheckGuards(std::byte* p, const Block& block);
 
   std::byte* end; // of what was ever taken, behind the last guard
