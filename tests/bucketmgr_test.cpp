@@ -52,6 +52,7 @@ TEST_F(Pools, DamagedHeaders) {
   const auto expect = [&](std::uint8_t* data, auto& field, auto value, unsigned size,
                           int line = __builtin_LINE()) {
     const auto old = std::exchange(field, static_cast<std::decay_t<decltype(field)>>(value));
+    EXPECT_EQ(Bucket::FromData(data), nullptr) << "line " << line;
     EXPECT_EQ(pool.GetSize(data), size) << "line " << line;
     EXPECT_EQ(pool.Contains(data), size != 0) << "line " << line;
     EXPECT_TRUE((size != 0 && size != 300) || !pool.Free(data)) << "line " << line;
@@ -123,6 +124,7 @@ TEST_F(Pools, IsValidSeesEachDamage) {
   std::vector<std::uint8_t*> p;
   for (int i = 0; i < 9; ++i)
     p.push_back(Alloc(mgr, 4));
+  std::memset(p[4], 0, 4); // reads as the header of a free record, and is none
   for (const unsigned i : {4u, 6u, 7u, 8u})
     mgr.Free(p[i]);
   Alloc(mgr, 100);
@@ -166,7 +168,18 @@ TEST_F(Pools, IsValidSeesEachDamage) {
   damage(pool.groups[1], &group);
   damage(pool.enabled, false);
   damage(last.prev, nullptr);
+  group.numFreeBuckets = 1;
+  damage(empty.next2, nullptr);
+  group.numFreeBuckets = 2;
   EXPECT_TRUE(IsValid(pool));
+
+  BucketMgr& disabled = *Make("on=0").GetBucketMgr();
+  disabled.extRecs = pool.extRecs;
+  disabled.numExtRecs = 2;
+  EXPECT_FALSE(IsValid(disabled));
+  disabled.extRecs = nullptr;
+  disabled.numExtRecs = 0;
+  EXPECT_TRUE(IsValid(disabled));
 }
 
 // A pool whose handle ended leads nowhere.
