@@ -3,11 +3,9 @@
 #include "Failure.h"
 #include "Massif.h"
 #include "Replay.h"
+#include "Target.h"
 #include "TraceSummary.h"
 
-#include <cstddef>
-#include <cstdint>
-#include <cstdlib>
 #include <sstream>
 #include <string>
 
@@ -16,22 +14,17 @@ using namespace VOK::MemPool::Tools;
 
 namespace {
 
-void Demand(bool condition) {
-  if (!condition) std::abort();
-}
-
 void CheckSums(const TraceLedger& ledger) {
-  std::uint64_t records = 0;
-  std::uint64_t bytes = 0;
+  std::uint64_t records = ledger.GetLive().size();
+  std::uint64_t bytes = ledger.bytes;
+  std::uint64_t atPeak = ledger.peakBytes;
   for (const TracedPool* pool : ledger.GetStanding()) {
-    records += pool->records + pool->uncertainRecords;
-    bytes += pool->bytes;
+    records -= pool->records + pool->uncertainRecords;
+    bytes -= pool->bytes;
   }
-  Demand(records == ledger.GetLive().size() && bytes == ledger.bytes);
-  std::uint64_t atPeak = 0;
   for (const auto& [addr, held] : ledger.GetPoolsAtPeak())
-    atPeak += held;
-  Demand(atPeak == ledger.peakBytes);
+    atPeak -= held;
+  Demand(records == 0 && bytes == 0 && atPeak == 0);
 }
 
 void ReadLines(const std::string& input) {
@@ -57,8 +50,6 @@ void ReadLines(const std::string& input) {
 }
 
 } // namespace
-
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size);
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   ZOR_VOK_MEMPOOL_ON(true);

@@ -1,5 +1,5 @@
 // The environment as the platform gives it.
-// Test: tests/process_test.cpp.
+// Test: tests/process_test.py.
 #include "tarnkit/Tarn_Env.h"
 
 #include <cstdlib>

@@ -1,5 +1,5 @@
 // The one operation of the sibling library that the pools need: a look into the environment.
-// Test: tests/process_test.cpp.
+// Test: tests/process_test.py.
 #ifndef TARN_ENV_H
 #define TARN_ENV_H
 

@@ -1,5 +1,6 @@
 // What no call on an intact pool shows: damaged headers, foreign memory, and the walk of
 // Invariants.
+#include "support/ArenaHeap.h"
 #include "support/Process.h"
 
 #include "engine/Bucket.h"

@@ -1,5 +1,5 @@
 // The reports of a pool's buckets: each against itself, its neighbours and the pool's tables.
-// Test: tests/tools/report_test.cpp.
+// Test: tests/tools/tools_test.py.
 #include "Checker.h"
 
 #include <map>

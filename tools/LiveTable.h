@@ -1,6 +1,6 @@
 // The live records of a trace by address: a table with open addressing, since finding, adding and
 // taking out is nearly all the work of a long trace.
-// Test: tests/tools/trace_test.cpp.
+// Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_LIVETABLE_H
 #define VOK_MEMPOOL_TOOLS_LIVETABLE_H
 

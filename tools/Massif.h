@@ -1,5 +1,5 @@
 // Live bytes over the course of a trace, in the form that ms_print draws.
-// Test: tests/tools/trace_test.cpp.
+// Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_MASSIF_H
 #define VOK_MEMPOOL_TOOLS_MASSIF_H
 

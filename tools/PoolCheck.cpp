@@ -1,5 +1,5 @@
 // A pool's header block, histogram and tables against each other.
-// Test: tests/tools/report_test.cpp.
+// Test: tests/tools/tools_test.py.
 #include "Checker.h"
 
 #include <map>

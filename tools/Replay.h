@@ -1,6 +1,6 @@
 // The pools of a trace made anew: the same operations on the real library, whose own report then
 // shows them as they stood at a line.
-// Test: tests/tools/trace_test.cpp.
+// Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_REPLAY_H
 #define VOK_MEMPOOL_TOOLS_REPLAY_H
 

@@ -1,5 +1,5 @@
 // Whether a report agrees with itself: each sum and each cross-reference that its text allows.
-// Test: tests/tools/report_test.cpp.
+// Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_REPORTCHECK_H
 #define VOK_MEMPOOL_TOOLS_REPORTCHECK_H
 

@@ -1,5 +1,5 @@
 // vokmempool report: finds the reports in a text and shows them in the form asked for.
-// Test: tests/tools/command_test.cpp.
+// Test: tests/tools/tools_test.py.
 #include "Commands.h"
 #include "Failure.h"
 #include "Files.h"

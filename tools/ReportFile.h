@@ -1,5 +1,5 @@
 // The reports of a file, as all commands that read one take them.
-// Test: tests/tools/command_test.cpp.
+// Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_REPORTFILE_H
 #define VOK_MEMPOOL_TOOLS_REPORTFILE_H
 

@@ -1,5 +1,5 @@
 // The grid of a record map, read: the body of its section.
-// Test: tests/tools/report_test.cpp.
+// Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_REPORTGRID_H
 #define VOK_MEMPOOL_TOOLS_REPORTGRID_H
 

@@ -1,5 +1,5 @@
 // Reports as a JSON document, and back. docs/report-json.md tells the form.
-// Test: tests/tools/report_test.cpp.
+// Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_REPORTJSON_H
 #define VOK_MEMPOOL_TOOLS_REPORTJSON_H
 

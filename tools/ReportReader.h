@@ -1,5 +1,5 @@
 // From the text of a program to the reports in it.
-// Test: tests/tools/report_test.cpp.
+// Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_REPORTREADER_H
 #define VOK_MEMPOOL_TOOLS_REPORTREADER_H
 

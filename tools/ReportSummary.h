@@ -1,5 +1,5 @@
 // The pools of a text side by side: what each holds, and what of that its callers use.
-// Test: tests/tools/report_test.cpp.
+// Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_REPORTSUMMARY_H
 #define VOK_MEMPOOL_TOOLS_REPORTSUMMARY_H
 

@@ -1,5 +1,5 @@
 // From data back to the text of a report, as the library prints it.
-// Test: tests/tools/report_test.cpp.
+// Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_REPORTWRITER_H
 #define VOK_MEMPOOL_TOOLS_REPORTWRITER_H
 

@@ -1,5 +1,5 @@
 // vokmempool trace: reads the trace lines in a program's output and tells what they come to.
-// Test: tests/tools/command_test.cpp.
+// Test: tests/tools/tools_test.py.
 #include "Commands.h"
 #include "Failure.h"
 #include "Files.h"

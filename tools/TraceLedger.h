@@ -1,6 +1,6 @@
 // What the trace lines of a program come to: its pools, the records that live, and what the lines
 // can't have told. One line after the other; memory goes with the live records alone.
-// Test: tests/tools/trace_test.cpp.
+// Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_TRACELEDGER_H
 #define VOK_MEMPOOL_TOOLS_TRACELEDGER_H
 

@@ -1,5 +1,5 @@
 // The trace lines of a program's output: what a line tells, and the lines of a long text one by
-// one. Test: tests/tools/trace_test.cpp.
+// one. Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_TRACEREADER_H
 #define VOK_MEMPOOL_TOOLS_TRACEREADER_H
 

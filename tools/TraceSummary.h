@@ -1,5 +1,5 @@
 // What a trace came to, for a reader and for a program.
-// Test: tests/tools/trace_test.cpp.
+// Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_TRACESUMMARY_H
 #define VOK_MEMPOOL_TOOLS_TRACESUMMARY_H
 

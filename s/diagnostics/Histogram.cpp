@@ -1,6 +1,7 @@
 // How many live records of each size there are: the scan of a bucket, the histogram of a pool,
 // whose bars are scaled to the most frequent size, and the one of a bucket, one star a record.
 // Test: tests/report_test.cpp.
+#include "diagnostics/Records.h"
 #include "diagnostics/ReportLayout.h"
 #include "diagnostics/ReportText.h"
 #include "diagnostics/SizeFreqMap.h"
@@ -8,7 +9,6 @@
 #include "engine/BucketMgr.h"
 
 #include <algorithm>
-#include <cstddef>
 #include <cstdint>
 #include <ostream>
 
@@ -29,13 +29,12 @@ std::uint32_t Scale(const SizeFreqMap& sizes) {
 
 } // namespace
 
-// From what the records say, and not from the bucket's own count. It steps from type byte to type
-// byte, and reads none at or behind the end of the area.
+// From what the records say, and not from the bucket's own count.
 void Bucket::CollectUsedSizes(SizeFreqMap& sizes) const {
-  if (recSize == 0) return;
   std::uint32_t used = 0;
-  for (std::uint32_t at = 2 + offsetof(Rec, type); at < recsSize; at += recSize)
-    used += RecsBase()[at] == RecType::Used ? 1u : 0u;
+  ForEachRecord(*this, [&](std::uint32_t offset) {
+    if (TypeAt(*this, offset) == RecType::Used) ++used;
+  });
   sizes.Count(recSize - recHeaderSize, used);
 }
 

@@ -52,8 +52,7 @@ struct Figures {
   }
 
   explicit Figures(const BucketMgr& pool) {
-    for (std::uint32_t i = 0; i < pool.numGroups; ++i)
-      if (pool.groups[i] != nullptr) Add(*pool.groups[i]);
+    ForEachGroup(pool, [this](const Group& group, std::uint32_t) { Add(group); });
     for (const ExtRec* e = pool.extRecs; e != nullptr; e = e->next)
       usedSizes.Count(e->length, 1);
   }
@@ -109,11 +108,10 @@ void BucketMgr::Dbg(std::ostream& os, std::uint32_t depth, bool detailed, bool s
   if (!detailed) return;
 
   std::uint32_t number = 0;
-  for (std::uint32_t i = 0; i < numGroups; ++i) {
-    if (groups[i] == nullptr) continue;
-    for (const Bucket* b = groups[i]->head1; b != nullptr; b = b->next1)
+  ForEachGroup(*this, [&](const Group& group, std::uint32_t) {
+    for (const Bucket* b = group.head1; b != nullptr; b = b->next1)
       b->Dbg(os, ++number, depth + 1, showRecs, showFreeList);
-  }
+  });
 }
 
 void Mgr::Dbg() const { bucketMgr->Dbg(StandardOutput(), 0, false, false, false); }

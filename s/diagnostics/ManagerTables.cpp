@@ -33,16 +33,14 @@ void BucketMgr::DbgBuckets(std::ostream& os, std::uint32_t depth) const {
   os << Indent(depth + 1) << PoolTitle::buckets << GetNumBuckets() << ")" << std::endl;
   Table table(os, depth + 2, PoolColumns::buckets);
   std::uint32_t id = 0;
-  for (std::uint32_t i = 0; i < numGroups; ++i) {
-    if (groups[i] == nullptr) continue;
-    for (const Bucket* b = groups[i]->head1; b != nullptr; b = b->next1) {
-      __builtin_prefetch(b->next1); // the next header arrives while this row is written
+  ForEachGroup(*this, [&](const Group& group, std::uint32_t i) {
+    for (const Bucket* b = group.head1; b != nullptr; b = b->next1) {
       const std::uint32_t totalRecs = b->TotalRecs();
       const std::uint32_t usedRecs = totalRecs - b->freeRecs;
       table.Row().Cell(++id).Cell(i).Cell(usedRecs).Cell(b->freeRecs).Cell(totalRecs);
       table.Percent(PercentUsed(usedRecs, totalRecs)).Cell(b->recSize).Cell(PtrText(b)).End();
     }
-  }
+  });
 }
 
 void BucketMgr::DbgFreeBuckets(std::ostream& os, std::uint32_t depth, std::uint32_t freeBucks,
@@ -52,15 +50,15 @@ void BucketMgr::DbgFreeBuckets(std::ostream& os, std::uint32_t depth, std::uint3
      << std::endl;
   Table table(os, depth + 2, PoolColumns::freeBuckets);
   std::uint32_t id = 0;
-  for (std::uint32_t i = 0; i < numGroups; ++i) {
-    if (groups[i] == nullptr || groups[i]->head2 == nullptr) continue;
-    const Bucket* b = groups[i]->head2;
-    table.Row().Cell(++id).Cell(i).Cell(b->recSize - recHeaderSize).Cell(CountFree(*groups[i]));
+  ForEachGroup(*this, [&](const Group& group, std::uint32_t i) {
+    const Bucket* b = group.head2;
+    if (b == nullptr) return;
+    table.Row().Cell(++id).Cell(i).Cell(b->recSize - recHeaderSize).Cell(CountFree(group));
     table.Cell(0u).LastCell(PtrText(b)).End();
     std::uint32_t off = 0;
     while ((b = b->next2) != nullptr)
       table.Row().Blank().Blank().Blank().Blank().Cell(++off).LastCell(PtrText(b)).End();
-  }
+  });
   os << std::endl;
 }
 

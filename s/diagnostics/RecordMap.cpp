@@ -16,6 +16,8 @@ namespace VOK::MemPool {
 
 namespace {
 
+using Recs = vector<const Rec*>;
+
 /// The margin of every line but the heading and the size line.
 std::ostream& Margin(std::ostream& os) { return os << std::setw(5) << " "; }
 
@@ -39,6 +41,60 @@ void Heading(std::ostream& os, std::uint32_t numbers) {
   os << std::endl;
 }
 
+// Each of these writes a line of `cells` boxes, from the record at index `first`.
+
+void DbgMapRule(std::ostream& os, std::uint16_t cells) {
+  Margin(os) << "+";
+  for (std::uint16_t i = 0; i < cells; ++i)
+    os << "---------+";
+  os << std::endl;
+}
+
+void DbgMapTypes(std::ostream& os, const Bucket& bucket, std::uint16_t cells, std::uint16_t first,
+                 const Recs& recs) {
+  Margin(os) << "| ";
+  for (std::uint32_t i = first; i < first + cells; ++i) {
+    const std::uint32_t offset = bucket.OffsetOf(recs[i]);
+    const std::string label = TypeLabel(TypeAt(bucket, offset));
+    Box(os, 8, offset == bucket.freeHead ? label + " +" : label);
+  }
+  os << std::endl;
+}
+
+void DbgMapOffsets(std::ostream& os, const Bucket& bucket, std::uint16_t cells, std::uint16_t first,
+                   const Recs& recs) {
+  Margin(os) << "| ";
+  for (std::uint32_t i = first; i < first + cells; ++i)
+    TaggedBox(os, "o=", bucket.OffsetOf(recs[i]));
+  os << std::endl;
+}
+
+void DbgMapSizes(std::ostream& os, const Bucket& bucket, std::uint16_t cells, std::uint16_t first) {
+  os << std::setw(4) << first << " | ";
+  for (std::uint16_t i = 0; i < cells; ++i)
+    TaggedBox(os, "s=", bucket.recSize);
+  os << std::endl;
+}
+
+void DbgMapData(std::ostream& os, const Bucket& bucket, std::uint16_t cells, std::uint16_t first,
+                const Recs& recs) {
+  Margin(os) << "| ";
+  for (std::uint32_t i = first; i < first + cells; ++i) {
+    switch (TypeAt(bucket, bucket.OffsetOf(recs[i]))) {
+    case RecType::Free:
+      TaggedBox(os, "n=", recs[i]->Offset());
+      break;
+    case RecType::Used:
+      TaggedBox(os, "d=", bucket.recSize - recHeaderSize);
+      break;
+    default:
+      TaggedBox(os, "u=", 0u);
+      break;
+    }
+  }
+  os << std::endl;
+}
+
 } // namespace
 
 void Bucket::DbgMap(std::ostream& os) const {
@@ -49,10 +105,10 @@ void Bucket::DbgMap(std::ostream& os) const {
   ForEachRecord(*this, [&](std::uint32_t offset) { recs.Append(RecAt(offset)); });
 
   const auto row = [&](std::uint16_t cells, std::uint16_t first) {
-    DbgMapTypes(os, cells, first, recs);
-    DbgMapOffsets(os, cells, first, recs);
-    DbgMapSizes(os, cells, first);
-    DbgMapData(os, cells, first, recs);
+    DbgMapTypes(os, *this, cells, first, recs);
+    DbgMapOffsets(os, *this, cells, first, recs);
+    DbgMapSizes(os, *this, cells, first);
+    DbgMapData(os, *this, cells, first, recs);
   };
   const auto width = static_cast<std::uint16_t>(std::min<std::uint32_t>(recs.count, boxes));
   const auto rest = static_cast<std::uint16_t>(totalRecs % boxes);
@@ -67,58 +123,6 @@ void Bucket::DbgMap(std::ostream& os) const {
   if (rest == 0) return;
   row(rest, full);
   DbgMapRule(os, rest);
-}
-
-void Bucket::DbgMapRule(std::ostream& os, std::uint16_t cells) const {
-  Margin(os) << "+";
-  for (std::uint16_t i = 0; i < cells; ++i)
-    os << "---------+";
-  os << std::endl;
-}
-
-void Bucket::DbgMapTypes(std::ostream& os, std::uint16_t cells, std::uint16_t first,
-                         const Recs& recs) const {
-  Margin(os) << "| ";
-  for (std::uint32_t i = first; i < first + cells; ++i) {
-    const std::uint32_t offset = OffsetOf(recs[i]);
-    const std::string label = TypeLabel(TypeAt(*this, offset));
-    Box(os, 8, offset == freeHead ? label + " +" : label);
-  }
-  os << std::endl;
-}
-
-void Bucket::DbgMapOffsets(std::ostream& os, std::uint16_t cells, std::uint16_t first,
-                           const Recs& recs) const {
-  Margin(os) << "| ";
-  for (std::uint32_t i = first; i < first + cells; ++i)
-    TaggedBox(os, "o=", OffsetOf(recs[i]));
-  os << std::endl;
-}
-
-void Bucket::DbgMapSizes(std::ostream& os, std::uint16_t cells, std::uint16_t first) const {
-  os << std::setw(4) << first << " | ";
-  for (std::uint16_t i = 0; i < cells; ++i)
-    TaggedBox(os, "s=", recSize);
-  os << std::endl;
-}
-
-void Bucket::DbgMapData(std::ostream& os, std::uint16_t cells, std::uint16_t first,
-                        const Recs& recs) const {
-  Margin(os) << "| ";
-  for (std::uint32_t i = first; i < first + cells; ++i) {
-    switch (TypeAt(*this, OffsetOf(recs[i]))) {
-    case RecType::Free:
-      TaggedBox(os, "n=", recs[i]->Offset());
-      break;
-    case RecType::Used:
-      TaggedBox(os, "d=", recSize - recHeaderSize);
-      break;
-    default:
-      TaggedBox(os, "u=", 0u);
-      break;
-    }
-  }
-  os << std::endl;
 }
 
 } // namespace VOK::MemPool

@@ -4,11 +4,7 @@
 
 #include "services/Trace.h"
 
-#include <charconv>
-#include <iterator>
-#include <locale>
-#include <string_view>
-#include <system_error>
+#include <cassert>
 
 namespace VOK::MemPool {
 
@@ -65,24 +61,16 @@ Table& Table::Id(std::uint32_t number) {
   return *this;
 }
 
-// The stream forms a fraction through the C library, which is a third of a row's cost, so the
-// digits are formed here where the stream would write them as they are.
 Table& Table::Percent(double number) {
   os.width(NextWidth() - 1);
   os << std::fixed;
   os.precision(3);
-  char digits[16];
-  const auto end = std::to_chars(digits, std::end(digits), number, std::chars_format::fixed, 3);
-  const bool asTheyAre = end.ec == std::errc() && os.getloc() == std::locale::classic() &&
-                         (os.flags() & std::ios::showpos) == 0;
-  if (asTheyAre)
-    os << std::string_view(digits, end.ptr);
-  else
-    os << number;
+  os << number;
   return Text("% ");
 }
 
 Table& Table::Bar(std::uint32_t stars) {
+  NextWidth(); // a bar has the length of its number
   os.width(static_cast<std::streamsize>(stars));
   os.fill('*');
   os << "*";
@@ -95,6 +83,14 @@ Table& Table::Text(const char* text) {
   return *this;
 }
 
-void Table::End() { os << std::endl; }
+void Table::End() {
+  assert(next == columns.size());
+  os << std::endl;
+}
+
+int Table::NextWidth() {
+  assert(next < columns.size());
+  return columns[next++].width;
+}
 
 } // namespace VOK::MemPool

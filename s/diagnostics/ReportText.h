@@ -77,10 +77,11 @@ public:
   /// A text right behind what the row has.
   Table& Text(const char* text);
 
+  /// Ends the row. REQUIRES: it has a cell in each column.
   void End();
 
 private:
-  int NextWidth() { return columns[next++].width; }
+  int NextWidth();
 
   std::ostream& os;
   const std::string indent;

@@ -4,7 +4,6 @@
 #ifndef VOK_MEMPOOL_BUCKET_H
 #define VOK_MEMPOOL_BUCKET_H
 
-#include "MemPool"
 #include "engine/HotCold.h"
 #include "engine/Rec.h"
 
@@ -111,21 +110,11 @@ struct Bucket {
            bool showFreeList) const;
 
 private:
-  using Recs = vector<const Rec*>;
-
   void Carve();
 
   void DbgHistogram(std::ostream& os, std::uint32_t depth) const;
   void DbgRecs(std::ostream& os, std::uint32_t depth) const;
   void DbgMap(std::ostream& os) const;
-  void DbgMapRule(std::ostream& os, std::uint16_t cells) const;
-  void DbgMapTypes(std::ostream& os, std::uint16_t cells, std::uint16_t first,
-                   const Recs& recs) const;
-  void DbgMapOffsets(std::ostream& os, std::uint16_t cells, std::uint16_t first,
-                     const Recs& recs) const;
-  void DbgMapSizes(std::ostream& os, std::uint16_t cells, std::uint16_t first) const;
-  void DbgMapData(std::ostream& os, std::uint16_t cells, std::uint16_t first,
-                  const Recs& recs) const;
   void DbgFreeList(std::ostream& os, std::uint32_t depth) const;
 };
 

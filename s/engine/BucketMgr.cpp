@@ -145,7 +145,7 @@ void BucketMgr::Clear() noexcept {
 
 std::uint32_t BucketMgr::GetNumBuckets() const {
   std::uint32_t sum = 0;
-  ForEachGroup(*this, [&sum](const Group& group) { sum += group.numBuckets; });
+  ForEachGroup(*this, [&](const Group& group, std::uint32_t) { sum += group.numBuckets; });
   return sum;
 }
 

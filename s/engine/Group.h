@@ -62,15 +62,15 @@ private:
   bool ReleaseEmptied(Bucket* b);
 };
 
-/// Calls `visit` with each Group of `pool`, in the order of the table.
+static_assert(sizeof(Group) <= 4 * sizeof(void*) + 2 * 4 + 2 * 2 + (sizeof(void*) - 4),
+              "the count of records fills what alignment leaves");
+
+/// Calls `visit` with each Group of the pool and its index, in the order of the table.
 template <class Visit>
 void ForEachGroup(const BucketMgr& pool, Visit visit) {
   for (std::uint32_t i = 0; i < pool.numGroups; ++i)
-    if (Group* const group = pool.groups[i]) visit(*group);
+    if (Group* const group = pool.groups[i]) visit(*group, i);
 }
-
-static_assert(sizeof(Group) <= 4 * sizeof(void*) + 2 * 4 + 2 * 2 + (sizeof(void*) - 4),
-              "the count of records fills what alignment leaves");
 
 // The head of the second list is tested in place of its count, since it is needed next.
 VOK_HOT void* Group::Alloc() {

@@ -1,6 +1,6 @@
 // The operations of a pool while trace is on or a memory-checking tool is present. The tools learn
 // of blocks and records here and nowhere else, so that buckets, Groups and ExtRecs know of none.
-// Test: tests/trace_test.cpp, tests/observer_test.sh.
+// Test: tests/trace_test.cpp, tests/process_test.py.
 #include "engine/Bucket.h"
 #include "engine/BucketMgr.h"
 #include "engine/ExtRec.h"
@@ -76,7 +76,7 @@ bool BucketMgr::FreeReported(void* p) {
 VOK_COLD void BucketMgr::ReportAllGone() const {
   for (ExtRec* e = extRecs; e != nullptr; e = e->next)
     ReportGone(e);
-  ForEachGroup(*this, [](Group& group) {
+  ForEachGroup(*this, [](const Group& group, std::uint32_t) {
     for (Bucket* b = group.head1; b != nullptr; b = b->next1) {
       for (std::uint32_t offset = 2; offset < b->recsSize; offset += b->recSize)
         if (Rec* const rec = b->RecAt(offset); rec->type == RecType::Used)

@@ -91,14 +91,12 @@ bool IsValid(const BucketMgr& pool) {
       pool.minRecSize % pool.dataAlignment != 0 || pool.maxRecSize % pool.dataAlignment != 0 ||
       pool.numGroups != (pool.maxRecSize - pool.minRecSize) / pool.dataAlignment + 1)
     return false;
-  for (std::uint32_t i = 0; i < pool.numGroups; ++i) {
-    const Group* const group = pool.groups[i];
-    if (group == nullptr) continue;
-    if (!pool.enabled || group->owner != &pool ||
-        RecSizeIndex(group->dataSize, pool.minRecSize, pool.dataAlignment) != i || !IsValid(*group))
-      return false;
-  }
-  return ExtRecsAreValid(pool) && (pool.enabled || pool.extRecs == nullptr);
+  bool groupsAreValid = true;
+  ForEachGroup(pool, [&](const Group& group, std::uint32_t i) {
+    groupsAreValid = groupsAreValid && pool.enabled && group.owner == &pool && IsValid(group) &&
+                     RecSizeIndex(group.dataSize, pool.minRecSize, pool.dataAlignment) == i;
+  });
+  return groupsAreValid && ExtRecsAreValid(pool) && (pool.enabled || pool.extRecs == nullptr);
 }
 
 } // namespace VOK::MemPool

@@ -1,5 +1,5 @@
 // The public handle: a pool's life, its name, and the one limit on a request's size.
-// Test: tests/registry_test.cpp, tests/process_test.cpp.
+// Test: tests/registry_test.cpp, tests/process_test.py.
 #include "MemPool"
 
 #include "engine/BucketMgr.h"

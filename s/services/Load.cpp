@@ -1,7 +1,7 @@
 // The library's start and end: all its load-time objects, in their order, in the one unit that has
 // an initialiser. A client runs behind them, since a library is initialised before its users;
 // nothing else secures that the registry and the settings stand before the first Mgr.
-// Test: tests/process_test.cpp, scripts/check-library.
+// Test: tests/process_test.py, scripts/check-library.
 #include "services/MgrRegistry.h"
 #include "services/Observers.h"
 #include "services/Output.h"
@@ -18,29 +18,30 @@ struct RegistryLife {
   ~RegistryLife() { MgrRegistry::End(); }
 };
 
-struct SettingsLife {
-  SettingsLife() { Settings::Load(); }
+// A stream stores its fill character when it is first asked for it. Asked here, later lines of two
+// threads only read it.
+struct OutputLife {
+  OutputLife() { std::cout.fill(); }
 };
 
 struct ObserversLife {
   ObserversLife() { Observers::Begin(); }
 };
 
+struct SettingsLife {
+  SettingsLife() { Settings::Load(); }
+};
+
+// The settings come last, since they may refuse the load with an exception. The library stays
+// mapped then, and a program that loads it again gets it as it is: whole.
 const RegistryLife registryLife;
-const SettingsLife settingsLife;
+const OutputLife outputLife;
 const ObserversLife observersLife;
+const SettingsLife settingsLife;
 
 } // namespace
 
 std::ostream& StandardOutput() { return std::cout; }
 std::ostream& StandardError() { return std::cerr; }
-
-OutputLine::OutputLine() : os(std::cout.rdbuf()) {
-  os.setstate(std::cout.rdstate());
-  os.imbue(std::cout.getloc());
-  os.flags(std::cout.flags());
-  os.fill(std::cout.fill());
-  os.width(std::cout.width(0)); // the next insertion uses it up
-}
 
 } // namespace VOK::MemPool

@@ -1,15 +1,13 @@
 // Every line of the library that is neither trace nor report is formed here.
-// Test: tests/process_test.cpp.
+// Test: tests/process_test.py.
 #include "services/Messages.h"
 
-#include "services/Output.h"
+#include "services/OutputLine.h"
 
 #include <algorithm>
 #include <charconv>
 #include <cstdlib>
 #include <cstring>
-#include <iomanip>
-#include <ostream>
 
 namespace VOK::MemPool::Messages {
 
@@ -17,23 +15,23 @@ namespace {
 
 const char* const source = "../s/MemPool";
 
-// Field by field, under whatever state the stream is in; the line number alone has a width.
+// Field by field, in whatever format the stream has; the source line alone has a width.
 __attribute__((cold)) void WriteLine(const char* severity, Text text, unsigned line) {
   OutputLine output;
-  std::ostream& os = output.Stream();
-  os << severity << ":" << source << ":" << std::setw(5) << line << ": ";
+  output << severity << ":" << source << ":";
+  output.Width(5) << line << ": ";
   for (const Piece& piece : text)
-    piece.WriteTo(os);
-  os << std::endl;
+    piece.WriteTo(output);
+  output.End();
 }
 
 } // namespace
 
-void Piece::WriteTo(std::ostream& os) const {
+void Piece::WriteTo(OutputLine& line) const {
   if (text != nullptr)
-    os << text;
+    line << text;
   else
-    os << number;
+    line << number;
 }
 
 char* Piece::WriteTo(char* to, const char* end) const {
@@ -66,7 +64,7 @@ void RefuseLoad(Text text, unsigned line) {
   for (const Piece& piece : text)
     to = piece.WriteTo(to, end);
   *to = '\0';
-  StandardError() << refusal << std::endl;
+  (OutputLine(StandardError()) << refusal).End();
   throw static_cast<const char*>(refusal);
 }
 

@@ -1,15 +1,18 @@
 // The message lines of the library, one function a severity. Each is told the line of the statement
 // that reports, and what the severity stands for happens here: an ERROR ends the process.
-// Test: tests/process_test.cpp.
+// Test: tests/process_test.py.
 #ifndef VOK_MEMPOOL_MESSAGES_H
 #define VOK_MEMPOOL_MESSAGES_H
 
 #include <concepts>
 #include <cstdint>
 #include <initializer_list>
-#include <iosfwd>
 
-namespace VOK::MemPool::Messages {
+namespace VOK::MemPool {
+
+class OutputLine;
+
+namespace Messages {
 
 /// One insertion of a message's text. A switch is written as the digit 1 or 0.
 class Piece {
@@ -17,7 +20,7 @@ public:
   Piece(const char* text_) : text(text_), number(0) {}
   Piece(std::unsigned_integral auto number_) : text(nullptr), number(number_) {}
 
-  void WriteTo(std::ostream& os) const;
+  void WriteTo(OutputLine& line) const;
   /// Writes the piece in decimal between `to` and `end`, cut to the room; returns its end there.
   char* WriteTo(char* to, const char* end) const;
 
@@ -39,6 +42,8 @@ void Info(Text text, unsigned line = __builtin_LINE());
 /// characters. The text stays readable as long as the library is loaded.
 [[noreturn]] void RefuseLoad(Text text, unsigned line = __builtin_LINE());
 
-} // namespace VOK::MemPool::Messages
+} // namespace Messages
+
+} // namespace VOK::MemPool
 
 #endif

@@ -1,12 +1,10 @@
 // What each checker is told, in its own words. None is a dependency: memcheck is reached by a
 // sequence of instructions that means nothing outside of it, the others by names that stay null
 // where nobody defines them.
-// Test: tests/observer_test.sh.
+// Test: tests/process_test.py.
 #include "services/Observers.h"
 
-#include "services/Settings.h"
-
-#include <cstdint>
+#include <atomic>
 
 // Named by what they mean here; what the linker looks for stands beside.
 #ifdef _WIN32
@@ -27,7 +25,7 @@ void VokHeaptrackGone(void*) VOK_WEAK("heaptrack_free");
 namespace VOK::MemPool::Observers {
 
 bool present = false;
-bool watching = false;
+std::uint8_t watching = 0;
 
 namespace {
 
@@ -117,10 +115,20 @@ void Gone(void* p) {
 void Begin() {
   Memcheck::isThere = Memcheck::Look();
   present = Memcheck::isThere || AddressSanitizer::IsThere() || Heaptrack::IsThere();
-  Update();
+  SetTracing(IsTracing());
 }
 
-void Update() { watching = present || Settings::trace; }
+bool IsTracing() {
+  return (std::atomic_ref<std::uint8_t>(watching).load(std::memory_order_relaxed) &
+          watchingTrace) != 0;
+}
+
+// One store of the whole byte: the other bit doesn't change after the load.
+void SetTracing(bool on) {
+  const int bits = (on ? watchingTrace : 0) | (present ? watchingChecker : 0);
+  std::atomic_ref<std::uint8_t>(watching).store(static_cast<std::uint8_t>(bits),
+                                                std::memory_order_relaxed);
+}
 
 void BlockMade(void* block, std::size_t size) {
   constexpr std::size_t links = 2 * sizeof(void*);

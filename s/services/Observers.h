@@ -1,30 +1,35 @@
 // The checkers that may watch a process: memcheck, the address sanitizer, heaptrack. One library
 // serves all of them without a rebuild: it looks at load which are there, and tells them of each
-// block and record. Trace shares their byte, the one thing that the road of a request tests.
-// Test: tests/observer_test.sh.
+// block and record. Trace shares a byte with them, all that the fast path of a request tests.
+// Test: tests/process_test.py.
 #ifndef VOK_MEMPOOL_OBSERVERS_H
 #define VOK_MEMPOOL_OBSERVERS_H
 
 #include "engine/HotCold.h"
 
 #include <cstddef>
+#include <cstdint>
 
 namespace VOK::MemPool::Observers {
 
 /// A checker is there.
 extern VOK_HIDDEN bool present;
 
-/// Derived: a checker is there, or the trace switch is on.
-extern VOK_HIDDEN bool watching;
+/// Why a request leaves the fast path, bit by bit: trace is on, a checker is there. The first bit
+/// is the trace switch itself: a copy of it could disagree when two threads set it at once.
+extern VOK_HIDDEN std::uint8_t watching;
+inline constexpr std::uint8_t watchingTrace = 1;
+inline constexpr std::uint8_t watchingChecker = 2;
 
 inline bool Present() { return present; }
-VOK_HOT bool Watching() { return watching; }
+VOK_HOT bool Watching() { return watching != 0; }
 
-/// Looks for the checkers. Called once, while the library loads, behind the settings.
+/// The trace switch, which any thread may read and set at any time.
+bool IsTracing();
+void SetTracing(bool on);
+
+/// Looks for the checkers. Called once, while the library loads.
 void Begin();
-
-/// Derives `watching` anew. REQUIRED behind each change of the trace switch.
-void Update();
 
 // Each of these tells the checkers that are there, and does nothing if there are none.
 

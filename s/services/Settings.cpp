@@ -1,5 +1,5 @@
 // The table of environment keys and its reader, the banner, and the exported functions.
-// Test: tests/model_test.cpp, tests/process_test.cpp.
+// Test: tests/model_test.cpp, tests/process_test.py.
 #include "services/Settings.h"
 
 #include "MemPool"
@@ -18,7 +18,6 @@ std::uint16_t dataAlignment;
 std::uint32_t maxRecordSize;
 std::uint32_t minRecordSize;
 bool keepEmptyBuckets;
-bool trace = false;
 bool off;
 
 namespace {
@@ -50,7 +49,7 @@ constexpr Key keys[] = {
      }},
     {"ZOR_VOK_MEMPOOL_TRACE", Always,
      [](int n) {
-       if (n > 0) trace = true;
+       if (n > 0) Observers::SetTracing(true);
      }},
     {"ZOR_VOK_MEMPOOL_BUCKET_SIZE", Always,
      [](int n) {
@@ -96,7 +95,7 @@ void WriteBanner() {
   Messages::Info({"# Keep Empty Buckets : ", keepEmptyBuckets});
   Messages::Info({"# Max Record Size    : ", maxRecordSize});
   Messages::Info({"# Min Record Size    : ", minRecordSize});
-  Messages::Info({"# Trace              : ", trace});
+  Messages::Info({"# Trace              : ", Observers::IsTracing()});
   Messages::Info({"# Use Heap           : ", off});
 }
 
@@ -132,11 +131,8 @@ void ZOR_VOK_MEMPOOL_MIN_RECORD_SIZE(unsigned bytes) { Settings::minRecordSize =
 bool ZOR_VOK_MEMPOOL_KEEP_EMPTY_BUCKETS() { return Settings::keepEmptyBuckets; }
 void ZOR_VOK_MEMPOOL_KEEP_EMPTY_BUCKETS(bool keep) { Settings::keepEmptyBuckets = keep; }
 
-bool ZOR_VOK_MEMPOOL_TRACE() { return Settings::trace; }
-void ZOR_VOK_MEMPOOL_TRACE(bool trace) {
-  Settings::trace = trace;
-  Observers::Update();
-}
+bool ZOR_VOK_MEMPOOL_TRACE() { return Observers::IsTracing(); }
+void ZOR_VOK_MEMPOOL_TRACE(bool trace) { Observers::SetTracing(trace); }
 
 bool ZOR_VOK_MEMPOOL_ON() { return !Settings::off; }
 void ZOR_VOK_MEMPOOL_ON(bool on) { Settings::off = !on; }

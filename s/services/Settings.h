@@ -1,6 +1,7 @@
-// The seven process-wide settings. A pool copies them when it is built; the trace switch alone is
-// read at each event. They are plain variables with no lock, and have no end of their own.
-// Test: tests/model_test.cpp, tests/process_test.cpp.
+// The process-wide settings. A pool copies them when it is built. They are plain variables with no
+// lock, and have no end of their own. The trace switch, which each event reads, is a bit of the
+// byte that every request tests (services/Observers.h). Test: tests/model_test.cpp,
+// tests/process_test.py.
 #ifndef VOK_MEMPOOL_SETTINGS_H
 #define VOK_MEMPOOL_SETTINGS_H
 
@@ -15,7 +16,6 @@ extern VOK_HIDDEN std::uint16_t dataAlignment;
 extern VOK_HIDDEN std::uint32_t maxRecordSize;
 extern VOK_HIDDEN std::uint32_t minRecordSize;
 extern VOK_HIDDEN bool keepEmptyBuckets;
-extern VOK_HIDDEN bool trace;
 extern VOK_HIDDEN bool off;
 
 /// Stores the defaults, reads the environment keys, writes the banner if a key asks for it, and

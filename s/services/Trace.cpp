@@ -2,10 +2,9 @@
 // Test: tests/trace_test.cpp.
 #include "services/Trace.h"
 
-#include "services/Output.h"
+#include "services/OutputLine.h"
 
 #include <charconv>
-#include <ostream>
 
 namespace VOK::MemPool {
 
@@ -18,30 +17,22 @@ namespace Trace {
 
 namespace {
 
-std::ostream& Begin(OutputLine& line, const char* letter, const BucketMgr* pool) {
-  return line.Stream() << "zvpt:" << letter << BarePtrText(pool).text;
+OutputLine& Begin(OutputLine&& line, const char* letter, const BucketMgr* pool) {
+  return line << "zvpt:" << letter << BarePtrText(pool).text;
 }
 
 } // namespace
 
-void Constructed(const BucketMgr* pool) {
-  OutputLine line;
-  Begin(line, "c:", pool) << std::endl;
-}
+void Constructed(const BucketMgr* pool) { Begin(OutputLine(), "c:", pool).End(); }
 
-void Destroyed(const BucketMgr* pool) {
-  OutputLine line;
-  Begin(line, "d:", pool) << std::endl;
-}
+void Destroyed(const BucketMgr* pool) { Begin(OutputLine(), "d:", pool).End(); }
 
 void Allocated(const BucketMgr* pool, const void* p, std::uint32_t size) {
-  OutputLine line;
-  Begin(line, "a:", pool) << ":" << BarePtrText(p).text << ":" << size << std::endl;
+  (Begin(OutputLine(), "a:", pool) << ":" << BarePtrText(p).text << ":" << size).End();
 }
 
 void Freed(const BucketMgr* pool, const void* p) {
-  OutputLine line;
-  Begin(line, "f:", pool) << ":" << BarePtrText(p).text << ":" << std::endl;
+  (Begin(OutputLine(), "f:", pool) << ":" << BarePtrText(p).text << ":").End();
 }
 
 } // namespace Trace

@@ -1,11 +1,10 @@
-// The trace lines of all pools and the test of their switch. A line takes nothing from the heap, so
-// that what Free and Alloc have done can't fail any more in telling it.
+// The trace lines of all pools and the test of their switch. A line is reported after the fact or
+// in a destructor, so it allocates nothing and throws nothing: OutputLine sees to both.
 // Test: tests/trace_test.cpp.
 #ifndef VOK_MEMPOOL_TRACE_H
 #define VOK_MEMPOOL_TRACE_H
 
-#include "engine/HotCold.h"
-#include "services/Settings.h"
+#include "services/Observers.h"
 
 #include <cstdint>
 
@@ -23,7 +22,7 @@ struct BarePtrText {
 
 namespace Trace {
 
-inline bool IsOn() { return Settings::trace; }
+inline bool IsOn() { return Observers::IsTracing(); }
 
 void Constructed(const BucketMgr* pool);
 void Destroyed(const BucketMgr* pool);

@@ -1,177 +1,181 @@
-// A program that lives on the library.
-#include "Script.h"
-
+// What process_test starts: a program that does what its argument says, operations with ";" between
+// them and, after a "|", those at its exit. It is built three times: with the library, as a client
+// library, and as a host, which is linked with neither and loads them.
 #include <MemPool>
 
 #include <algorithm>
-#include <array>
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
-#include <iterator>
+#include <iostream>
+#include <locale>
+#include <memory>
 #include <new>
+#include <sstream>
 #include <string>
-#include <thread>
-#include <utility>
 #include <vector>
 
-namespace {
+#ifdef _WIN32
+#include <windows.h>
+#else
+#include <dlfcn.h>
+#include <sys/auxv.h>
+#endif
 
 using namespace VOK::MemPool;
 
-// Never destroyed, so that a leak checker finds in them what stands at the end.
-auto& pools = *new std::vector<Mgr*>;
-auto& blocks = *new std::vector<void*>;
+struct State {
+  Mgr& Pool() { return *pools.back(); }
+  unsigned Number() const { return static_cast<unsigned>(std::stoul(operand)); }
+  void*& Block() { return blocks[Number()]; }
 
-// Filled while the library loads, ahead of any constructor of this program.
-const char* lookups[16];
-std::size_t numLookups;
+  std::vector<Mgr*> pools;
+  std::vector<void*> blocks; // by their numbers in the order of requests
+  std::string operand;
+};
 
-unsigned Number(const std::string& text) { return static_cast<unsigned>(std::stoul(text)); }
+/// Runs the operation; false if there is none of that name.
+extern "C" bool Act(const std::string& name, State& state);
 
-void Drop(const std::string&) {
-  delete pools.back();
-  pools.pop_back();
+namespace {
+
+// Never destroyed, so that a leak checker finds in it what exists at the end.
+auto& ownState = *new State;
+void* handle;
+decltype(&Act) actOfClient;
+
+#ifdef _WIN32
+// What the platform has instead, under the names that the rest of this program uses.
+constexpr int RTLD_NOW = 0;
+void* dlopen(const char* path, int) { return LoadLibraryA(path); }
+void* dlsym(void* library, const char* name) {
+  return reinterpret_cast<void*>(GetProcAddress(static_cast<HMODULE>(library), name));
+}
+void dlclose(void* library) { FreeLibrary(static_cast<HMODULE>(library)); }
+#endif
+
+// The compiler takes dlopen for a function that never throws. Only a call that it can't see
+// through leaves the caller a way to catch what a load throws.
+void Open(State& s) {
+  void* (*volatile const open)(const char*, int) = dlopen;
+  handle = open(s.operand == "client" ? VOK_MEMPOOL_CLIENT : VOK_MEMPOOL_LIBRARY, RTLD_NOW);
+  if (handle == nullptr) std::abort();
+  actOfClient = reinterpret_cast<decltype(actOfClient)>(dlsym(handle, "Act"));
 }
 
-void Alloc(const std::string& size) {
-  void* block = nullptr;
-  try {
-    block = pools.back()->Alloc(Number(size));
-  } catch (const std::bad_alloc&) {
-    Say("bad_alloc");
-  }
-  blocks.push_back(block);
+// A locale that groups the digits of every number by one.
+void UseGroupingLocale(State&) {
+  struct Grouping : std::numpunct<char> {
+    char do_thousands_sep() const override { return '_'; }
+    std::string do_grouping() const override { return "\1"; }
+  };
+  std::locale::global(std::locale(std::locale::classic(), new Grouping));
+  std::cerr.imbue(std::locale());
 }
 
-void Free(const std::string&) {
-  Say(pools.back()->Free(blocks.back()) ? "freed" : "refused");
-  blocks.pop_back();
+#ifndef VOK_MEMPOOL_HOST
+const bool wanted = std::getenv("ZOR_STATIC_POOLS") != nullptr;
+const std::unique_ptr<Mgr> named(wanted ? new Mgr("client") : nullptr);
+const std::unique_ptr<Mgr> nameless(wanted ? new Mgr : nullptr);
+
+void Alloc(State& s) {
+  s.blocks.push_back(s.Pool().Alloc(s.Number()));
+  std::memset(s.blocks.back(), 1, std::min(s.Number(), 1U << 16));
 }
 
-// Each pool but the last is destroyed before the next one is made.
-void MakeNameless(const std::string& count) {
-  for (unsigned n = Number(count); n > 0; --n) {
-    pools.push_back(new Mgr);
-    if (n > 1) Drop("");
-  }
-}
+void Free(State& s) { std::cout << (s.Pool().Free(s.Block()) ? "freed\n" : "refused\n"); }
 
-void ShowNames(const std::string&) {
+// The compiler must not drop a write that nobody reads.
+void Write(State& s) { static_cast<volatile char*>(s.blocks.back())[std::stol(s.operand)] = 2; }
+
+void ShowNames(State&) {
   std::vector<Mgr*> mgrs;
   GetMgrs(mgrs);
-  std::string text = std::to_string(GetNumMgrs()) + " pools:";
+  std::cout << std::to_string(GetNumMgrs()) << " pools:";
   for (const Mgr* mgr : mgrs)
-    text += std::string(" ") + mgr->GetName();
-  Say(text);
+    std::cout << ' ' << mgr->GetName();
+  std::cout << std::endl;
 }
+#endif
 
-// A vector at the end of its range takes no more: an exception of the library's own code.
-void Overfill(const std::string&) {
-  VOK::vector<Mgr*> mgrs;
-  mgrs.count = mgrs.capacity = 1U << 31;
-  try {
-    GetMgrs(mgrs);
-  } catch (const std::bad_alloc&) {
-    Say("bad_alloc");
-  }
-}
-
-// Ends with a pool built under the switches alone, so that no size can stop it.
-void ShowSettings(const std::string&) {
-  std::string text;
-  for (const unsigned value :
-       {ZOR_VOK_MEMPOOL_BUCKET_SIZE(), ZOR_VOK_MEMPOOL_DATA_ALIGNMENT(),
-        ZOR_VOK_MEMPOOL_MAX_RECORD_SIZE(), ZOR_VOK_MEMPOOL_MIN_RECORD_SIZE()})
-    text += std::to_string(value) + " ";
-  for (const bool value : {ZOR_VOK_MEMPOOL_KEEP_EMPTY_BUCKETS(), ZOR_VOK_MEMPOOL_TRACE(),
-                           ZOR_VOK_MEMPOOL_ON(), ZOR_VOK_MEMPOOL_OFF()})
-    text += value ? "1 " : "0 ";
-  ZOR_VOK_MEMPOOL_BUCKET_SIZE(4010);
-  ZOR_VOK_MEMPOOL_DATA_ALIGNMENT(4);
-  ZOR_VOK_MEMPOOL_MAX_RECORD_SIZE(1000);
-  ZOR_VOK_MEMPOOL_MIN_RECORD_SIZE(8);
-  ZOR_VOK_MEMPOOL_TRACE(false);
-  Say(text + (Mgr("shown").IsEnabled() ? "1" : "0"));
-}
-
-// A handler and a static object that tell of the process's exit.
-void AwaitExit(const std::string&) {
-  struct Farewell {
-    ~Farewell() { Say("static object destroyed"); }
-  };
-  static const Farewell farewell;
-  std::atexit([] { ShowNames("at exit"); });
-}
-
-// `rounds` requests over 64 places; each block is filled, and checked before it goes.
-bool Work(Mgr& mgr, unsigned char mark, unsigned rounds) {
-  std::array<std::pair<unsigned char*, unsigned>, 64> places{};
-  bool kept = true;
-  for (unsigned i = 0; i < rounds + places.size(); ++i) {
-    auto& [data, size] = places[i % places.size()];
-    if (data != nullptr) {
-      kept = kept && std::count(data, data + size, mark) == std::ptrdiff_t(size) &&
-             mgr.Contains(data) && mgr.Free(data);
-      data = nullptr;
-    }
-    if (i >= rounds) continue;
-    size = 1 + i * 7 % 60;
-    data = static_cast<unsigned char*>(mgr.Alloc(size));
-    std::memset(data, mark, size);
-  }
-  return kept;
-}
-
-void RunThreads(const std::string& rounds) {
-  Mgr first("first");
-  Mgr second("second");
-  bool kept[2] = {};
-  std::thread other([&] { kept[1] = Work(second, 0x55, Number(rounds)); });
-  kept[0] = Work(first, 0xAA, Number(rounds));
-  other.join();
-  Say(kept[0] && kept[1] ? "nothing lost" : "lost");
-}
-
-const Verb verbs[] = {
-    {"say", Say},
-    {"settings", ShowSettings},
-    {"lookups",
-     [](const std::string&) {
-       for (std::size_t i = 0; i < numLookups; ++i)
-         Say(lookups[i]);
-     }},
-    {"bucket", [](const std::string& n) { ZOR_VOK_MEMPOOL_BUCKET_SIZE(Number(n)); }},
-    {"align", [](const std::string& n) { ZOR_VOK_MEMPOOL_DATA_ALIGNMENT(Number(n)); }},
-    {"max", [](const std::string& n) { ZOR_VOK_MEMPOOL_MAX_RECORD_SIZE(Number(n)); }},
-    {"min", [](const std::string& n) { ZOR_VOK_MEMPOOL_MIN_RECORD_SIZE(Number(n)); }},
-    {"trace", [](const std::string& n) { ZOR_VOK_MEMPOOL_TRACE(n == "1"); }},
-    {"pool", [](const std::string& name) { pools.push_back(new Mgr(name.c_str())); }},
-    {"nameless", MakeNameless},
-    {"drop", Drop},
+constexpr struct {
+  const char* name;
+  void (*act)(State& s);
+} operations[] = {
+    {"say", [](State& s) { std::cout << s.operand << std::endl; }},
+    {"grouping", UseGroupingLocale},
+    {"cut", [](State&) { std::_Exit(7); }}, // flushes no stream
+    {"open", Open},
+    {"close", [](State&) { dlclose(handle), actOfClient = nullptr; }},
+#ifndef _WIN32
+    {"raised", [](State&) { std::cout << getauxval(AT_SECURE) << std::endl; }},
+#endif
+#ifndef VOK_MEMPOOL_HOST
+    {"max", [](State& s) { ZOR_VOK_MEMPOOL_MAX_RECORD_SIZE(s.Number()); }},
+    {"min", [](State& s) { ZOR_VOK_MEMPOOL_MIN_RECORD_SIZE(s.Number()); }},
+    {"trace", [](State& s) { ZOR_VOK_MEMPOOL_TRACE(s.operand == "1"); }},
+    {"pool", [](State& s) { s.pools.push_back(new Mgr(s.operand.c_str())); }},
+    {"nameless", [](State& s) { s.pools.push_back(new Mgr); }},
+    {"drop", [](State& s) { delete &s.Pool(), s.pools.pop_back(); }},
+    {"clear", [](State& s) { s.Pool().Clear(); }},
+    {"report", [](State& s) { s.Pool().DbgDetailed(); }},
     {"alloc", Alloc},
     {"free", Free},
+    {"size", [](State& s) { std::cout << s.Pool().GetSize(s.Block()) << '\n'; }},
+    {"contains", [](State& s) { std::cout << s.Pool().Contains(s.Block()) << '\n'; }},
+    {"write", Write},
+    {"forget", [](State& s) { s.blocks.back() = nullptr; }},
     {"names", ShowNames},
-    {"overfill", Overfill},
-    {"report", [](const std::string&) { pools.back()->Dbg(); }},
-    {"hex", [](const std::string&) { std::cout << std::hex << std::uppercase; }},
-    {"global", [](const std::string&) { std::locale::global(GroupingLocale()); }},
-    {"imbue", [](const std::string&) { std::cout.imbue(GroupingLocale()); }},
-    {"await-exit", AwaitExit},
-    // Ends that flush no stream: what isn't written by then is lost.
-    {"cut", [](const std::string&) { std::_Exit(7); }},
-    {"cut-exit", [](const std::string&) { std::atexit([] { std::_Exit(7); }); }},
-    {"threads", RunThreads},
+#endif
 };
+
+// Leaves nothing of what lay on the stack below the caller.
+__attribute__((noinline)) void OverwriteStack() {
+  volatile char bytes[1 << 16];
+  for (volatile char& byte : bytes)
+    byte = '#';
+}
+
+void Run(const std::string& script) {
+  std::istringstream parts(script);
+  for (std::string part; std::getline(parts, part, ';');) {
+    std::istringstream words(part);
+    std::string name;
+    ownState.operand.clear();
+    words >> name >> ownState.operand;
+    const char* caught = nullptr;
+    try {
+      if (!Act(name, ownState) && actOfClient != nullptr) actOfClient(name, ownState);
+    } catch (const char* text) {
+      caught = text;
+    } catch (const std::bad_alloc&) { // of a request that no test relies on
+    }
+    OverwriteStack();
+    if (caught != nullptr) std::cout << caught << std::endl;
+  }
+}
 
 } // namespace
 
-#ifdef __GLIBC__
-// Stands in for the platform's function, to tell what is looked up and in which order.
+bool Act(const std::string& name, State& state) {
+  for (const auto& operation : operations)
+    if (operation.name == name) return operation.act(state), true;
+  return false;
+}
+
+#if defined(__GLIBC__) && !defined(VOK_MEMPOOL_HOST)
+// Stands in for the platform's function, to show what is looked up and in which order.
 char* secure_getenv(const char* key) noexcept {
-  if (std::strncmp(key, "ZOR_", 4) == 0 && numLookups < std::size(lookups))
-    lookups[numLookups++] = key;
+  if (std::getenv("ZOR_SHOW_KEYS") != nullptr) std::printf("%s\n", key);
   return std::getenv(key);
 }
 #endif
 
-int main(int argc, char** argv) { return RunScript(verbs, argc, argv); }
+int main(int, char** argv) {
+  std::istringstream scripts(argv[1]);
+  std::string script;
+  static std::string lastScript;
+  std::getline(std::getline(scripts, script, '|'), lastScript);
+  std::atexit([] { Run(lastScript); });
+  Run(script);
+}

@@ -1,19 +1,13 @@
-// What a test changes of its process, restored at its end: the settings, std::cout, the locale.
+// What a test changes of its process, restored at its end: the settings and the locale.
 #ifndef VOK_MEMPOOL_TESTS_PROCESS_H
 #define VOK_MEMPOOL_TESTS_PROCESS_H
 
-#include "support/ArenaHeap.h"
-
 #include "MemPool"
 
-#include <functional>
-#include <iostream>
 #include <locale>
 #include <map>
 #include <sstream>
-#include <streambuf>
 #include <string>
-#include <utility>
 
 /// Sets what the text names: "bucket=4010 align=4 max=1000 min=8 keep=0 trace=0 on=0".
 inline void Set(const std::string& words) {
@@ -34,28 +28,6 @@ inline void Set(const std::string& words) {
 
 struct KeepSettings {
   ~KeepSettings() { Set("bucket=4010 align=4 max=1000 min=8 keep=0 trace=0 on=0"); }
-};
-
-/// Catches std::cout and keeps its text off the arena.
-class CaughtOutput : std::streambuf {
-public:
-  explicit CaughtOutput(std::function<void()> atLine_ = [] {}) : atLine(std::move(atLine_)) {}
-  ~CaughtOutput() override { std::cout.rdbuf(before); }
-
-  /// What came since the last call.
-  std::string Take() { return std::exchange(text, {}); }
-
-private:
-  int_type overflow(int_type c) override {
-    const ArenaHeap::Use real(false);
-    text += traits_type::to_char_type(c);
-    if (c == '\n') atLine();
-    return c;
-  }
-
-  const std::function<void()> atLine;
-  std::streambuf* const before = std::cout.rdbuf(this);
-  std::string text;
 };
 
 /// While it lives, the global locale groups digits.

@@ -5,17 +5,20 @@
 #define VOK_MEMPOOL_TESTS_REFERENCE_H
 
 #include "support/ArenaHeap.h"
-#include "support/Process.h"
+
+#include "MemPool"
 
 #include <algorithm>
 #include <cstdint>
 #include <cstring>
 #include <deque>
 #include <initializer_list>
+#include <iostream>
 #include <map>
 #include <new>
 #include <sstream>
 #include <stdexcept>
+#include <streambuf>
 #include <string>
 #include <utility>
 #include <vector>
@@ -28,25 +31,37 @@ inline void Demand(bool condition, const char* what) {
 }
 
 /// What a call did to the heap and to std::cout, for the reference to say the same step by step.
-struct Log {
-  ArenaHeap& heap;
-  CaughtOutput output{[this] { heap.events.push_back({'|', {}, 0, nullptr, {}}); }};
-  std::size_t at = 0;
-  std::string text;
-
+class Log : std::streambuf {
+public:
   explicit Log(ArenaHeap& heap_) : heap(heap_) {}
-  /// The next event, which must be one of these kinds.
-  const ArenaHeap::Event& Next(const std::string& kinds) {
+  ~Log() override { std::cout.rdbuf(before); }
+
+  /// The next event, which must be one of these kinds; '|' is the line that `text` ends with.
+  const ArenaHeap::Event& Next(const std::string& kinds, const std::string& text = "") {
     Demand(at < heap.events.size() && kinds.find(heap.events[at].kind) != kinds.npos,
            "another use of heap or output");
+    expected += text;
     return heap.events[at++];
   }
   void End() {
     Demand(at == heap.events.size() && heap.faults.empty(), "heap or output used more");
-    Demand(output.Take() == std::exchange(text, {}), "other lines");
+    Demand(std::exchange(written, {}) == std::exchange(expected, {}), "other lines");
     heap.events.clear();
     at = 0;
   }
+
+private:
+  int_type overflow(int_type c) override {
+    const ArenaHeap::Use real(false);
+    written += traits_type::to_char_type(c);
+    if (c == '\n') heap.events.push_back({'|', {}, 0, nullptr, {}});
+    return c;
+  }
+
+  ArenaHeap& heap;
+  std::streambuf* const before = std::cout.rdbuf(this);
+  std::size_t at = 0;
+  std::string written, expected;
 };
 
 class Reference {
@@ -307,9 +322,8 @@ private:
     Release(Form::Array, at);
   }
   void Trace(const std::string& letter, const std::string& operands = "") {
-    if (!VOK::MemPool::ZOR_VOK_MEMPOOL_TRACE()) return;
-    log.Next("|");
-    log.text += "zvpt:" + letter + Text(pool) + operands + "\n";
+    if (VOK::MemPool::ZOR_VOK_MEMPOOL_TRACE())
+      log.Next("|", "zvpt:" + letter + Text(pool) + operands + "\n");
   }
   static std::string Text(const void* p) {
     std::ostringstream os;

@@ -1,12 +1,11 @@
 // The corpus of a fuzz target, replayed.
-#include <cstdint>
+#include "Target.h"
+
 #include <filesystem>
 #include <fstream>
 #include <gtest/gtest.h>
 #include <iterator>
 #include <vector>
-
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size);
 
 TEST(Corpus, VOK_MEMPOOL_TARGET) {
   unsigned count = 0;

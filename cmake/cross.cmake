@@ -1,0 +1,8 @@
+# Linux programs for another machine from Debian's cross compilers, for the toolchains that include
+# this and set CMAKE_SYSTEM_PROCESSOR. An emulator starts them, beside the compiler's own libraries.
+set(CMAKE_SYSTEM_NAME Linux)
+set(triple ${CMAKE_SYSTEM_PROCESSOR}-linux-gnu)
+set(CMAKE_C_COMPILER ${triple}-gcc)
+set(CMAKE_CXX_COMPILER ${triple}-g++)
+string(REPLACE i686 i386 machine ${CMAKE_SYSTEM_PROCESSOR})
+set(CMAKE_CROSSCOMPILING_EMULATOR qemu-${machine} -L /usr/${triple})

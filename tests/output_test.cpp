@@ -1,0 +1,197 @@
+// The lines of trace and messages: their text against insertions into the same stream, and what
+// they change of the stream, its buffer and the heap. The preset tsan runs the cases with threads.
+#include "MemPool"
+#include "engine/Bucket.h"
+#include "engine/BucketMgr.h"
+#include "services/Messages.h"
+#include "services/Observers.h"
+#include "services/OutputLine.h"
+#include "services/Trace.h"
+
+#include <barrier>
+#include <cfenv>
+#include <gmock/gmock.h>
+#include <iomanip>
+#include <iostream>
+#include <sstream>
+#include <thread>
+
+using namespace VOK::MemPool;
+
+static thread_local unsigned numAllocations;
+
+__attribute__((noinline)) void* operator new(std::size_t size) {
+  ++numAllocations;
+  return std::malloc(size);
+}
+__attribute__((noinline)) void operator delete(void* p) noexcept { std::free(p); }
+__attribute__((noinline)) void operator delete(void* p, std::size_t) noexcept { std::free(p); }
+
+namespace {
+
+bool dead = false; ///< buffers and locales of this test throw
+
+/// A locale that no number was formed in yet.
+std::locale Grouping(const char* sizes) {
+  struct Format : std::numpunct<char> {
+    explicit Format(const char* sizes_) : sizes(sizes_) {}
+    char do_thousands_sep() const override { return '_'; }
+    std::string do_grouping() const override { return dead ? throw 1 : sizes; }
+    const char* const sizes;
+  };
+  return std::locale(std::locale::classic(), new Format(sizes));
+}
+
+/// Takes the place of a stream's buffer while it lives. The stream throws what it can.
+struct Buffer : std::streambuf {
+  explicit Buffer(std::ostream& stream_) : stream(stream_), before(stream_.rdbuf(this)) {
+    format.copyfmt(stream);
+    stream.exceptions(std::ios::badbit | std::ios::failbit);
+    text.reserve(1000);
+  }
+  ~Buffer() override {
+    stream.copyfmt(format);
+    stream.rdbuf(before);
+  }
+  void imbue(const std::locale&) override { text += "imbued"; }
+  int_type overflow(int_type c) override { return text += dead ? throw 1 : char(c), c; }
+  int sync() override { return ++numFlushes, dead ? throw 1 : 0; }
+
+  std::ostream& stream;
+  std::streambuf* const before;
+  std::ios format{nullptr};
+  std::string text;
+  unsigned numFlushes = 0;
+};
+
+TEST(OutputLine, HasTheTextOfInsertions) {
+  using Flag = std::ios;
+  for (const char* const sizes : {"", "\1", "\3\2", "\2\377", "\3"})
+    for (const auto base : {Flag::dec, Flag::oct, Flag::hex, std::ios::fmtflags()})
+      for (const auto side : {Flag::left, Flag::right, Flag::internal, std::ios::fmtflags()})
+        for (const auto prefix :
+             {std::ios::fmtflags(), Flag::showbase, Flag::showbase | Flag::uppercase})
+          for (const int width : {0, 5, 50, 300})
+            for (const std::uint64_t number : {0ull, 7ull, 999ull, 43981ull, ~0ull}) {
+              std::ostringstream line;
+              std::ostringstream expected;
+              line.imbue(Grouping(sizes));
+              line.flags(base | side | prefix);
+              line << std::setfill('*') << std::setw(width);
+              expected.copyfmt(line);
+              OutputLine output(line);
+              output << "text" << number;
+              (output.Width(width) << number << "end").End();
+              expected << "text" << number << std::setw(width) << number << "end\n";
+              EXPECT_EQ(line.str(), expected.str());
+            }
+}
+
+TEST(OutputLine, ChangesNothingButAPendingWidth) {
+  for (const bool dies : {false, true}) {
+    std::ostringstream tied;
+    Buffer tiedBuffer(tied);
+    Buffer buffer(std::cout);
+    const std::locale locale = Grouping("\1");
+    std::cout.imbue(locale);
+    buffer.text.clear();
+    std::cout << std::hex << std::setfill('*') << std::setw(9);
+    std::cout.tie(&tied);
+    const std::ios::fmtflags flags = std::cout.flags();
+    const unsigned before = numAllocations;
+    dead = dies;
+    EXPECT_NO_THROW(Trace::Freed(nullptr, nullptr));
+    EXPECT_NO_THROW(Messages::Warning({0x123u}, 0xABC));
+    dead = false;
+    EXPECT_EQ(numAllocations, before);
+    EXPECT_EQ(buffer.text, dies ? "" : "****zvpt:f:0:0:\nWARNING:../s/MemPool:a_b_c: 1_2_3\n");
+    EXPECT_EQ(tiedBuffer.numFlushes, 2u);
+    EXPECT_TRUE(std::cout.good() && std::cout.flags() == flags && std::cout.width() == 0 &&
+                std::cout.fill() == '*' && std::cout.getloc() == locale && tied.good());
+  }
+}
+
+TEST(OutputLine, HidesNoLoadFailure) {
+  for (const bool dies : {false, true}) {
+    const Buffer buffer(std::cerr);
+    dead = dies;
+    try {
+      Messages::RefuseLoad({"reason ", 7u});
+    } catch (const char* text) {
+      EXPECT_THAT(std::string(text), testing::EndsWith(": reason 7"));
+      EXPECT_EQ(buffer.text, dies ? "" : std::string(text) + "\n");
+    }
+    dead = false;
+  }
+}
+
+void UseBucketsOfThree() {
+  ZOR_VOK_MEMPOOL_ON(true);
+  ZOR_VOK_MEMPOOL_BUCKET_SIZE(26);
+  ZOR_VOK_MEMPOOL_MAX_RECORD_SIZE(8);
+}
+
+TEST(Report, FormsAFractionAsTheStreamDoes) {
+  UseBucketsOfThree();
+  Mgr pool;
+  pool.Alloc(4);
+  for (const int mode : {FE_TONEAREST, FE_UPWARD}) {
+    std::fesetround(mode);
+    std::ostringstream report;
+    std::ostringstream expected;
+    pool.GetBucketMgr()->Dbg(report, 0, false, false, false);
+    const volatile double hundred = 100;
+    expected << std::fixed << std::setprecision(3) << hundred / 3 << "% ";
+    std::fesetround(FE_TONEAREST);
+    EXPECT_THAT(report.str(), testing::HasSubstr(expected.str()));
+  }
+}
+
+TEST(Threads, SwitchTraceAndItsLinesTogether) {
+  std::barrier<> both(2);
+  int numApart = 0;
+  const auto work = [&](bool on) {
+    for (int i = 0; i < 20000; ++i) {
+      both.arrive_and_wait();
+      ZOR_VOK_MEMPOOL_TRACE(on);
+      both.arrive_and_wait();
+      const bool watches = ZOR_VOK_MEMPOOL_TRACE() || Observers::Present();
+      if (on && Observers::Watching() != watches) ++numApart;
+    }
+  };
+  std::thread other(work, false);
+  work(true);
+  other.join();
+  EXPECT_EQ(numApart, 0);
+}
+
+TEST(Threads, WriteWholeLinesWithAPoolEach) {
+  UseBucketsOfThree();
+  ZOR_VOK_MEMPOOL_TRACE(true);
+  const auto work = [](Mgr& pool) {
+    for (int i = 0; i < 100; ++i) {
+      void* const p = pool.Alloc(4);
+      Bucket* const bucket = Bucket::FromData(p);
+      bucket->RecAt(bucket->freeHead)->SetOffset(bucket->freeHead); // a circle: the report warns
+      std::ostringstream report;
+      bucket->Dbg(report, 1, 0, false, true);
+      pool.Free(p);
+    }
+  };
+  Mgr first;
+  Mgr second;
+  testing::internal::CaptureStdout();
+  std::thread other(work, std::ref(second));
+  work(first);
+  other.join();
+  ZOR_VOK_MEMPOOL_TRACE(false);
+  std::istringstream lines(testing::internal::GetCapturedStdout());
+  int numWhole = 0;
+  for (std::string line; std::getline(lines, line);)
+    if (line.find_first_not_of("zvpt:0123456789abcdef") == std::string::npos ||
+        (line.starts_with("WARNING:") && line.ends_with(" recs 4 > 3")))
+      ++numWhole;
+  EXPECT_EQ(numWhole, 2 * 3 * 100);
+}
+
+} // namespace

@@ -1,0 +1,374 @@
+#!/usr/bin/env python3
+"""vokmempool as its users start it: commands, damaged reports and documents, what the library
+writes, and random trace lines against a literal count.
+
+usage: tools_test.py VOKMEMPOOL RANDOM_POOLS GOLDEN
+
+VOK_MEMPOOL_APPROVE in the environment writes the golden text of the messages anew.
+"""
+import json
+import os
+import random
+import re
+import shlex
+import sys
+import tempfile
+from collections import Counter
+from pathlib import Path
+
+from support import PROGRAM, Work, data_of, run, same, tool
+
+GOLDEN = Path(sys.argv[3]).resolve()
+REPORTS = {path.stem: path.read_text() for path in (GOLDEN / "report").iterdir()}
+DEMO, DETAILED = REPORTS["demo-64"], REPORTS["detailed-64"]
+def golden(name):
+    return (GOLDEN / f"tools/{name}.txt").read_text()
+
+
+USAGE = "\nusage: vokmempool SUBCOMMAND [OPTIONS] [FILE]\n"
+PLAIN = "-: line 1: a plain report, which has no records to draw"
+TRACE = """zvpt:c:a0
+zvpt:a:a0:1000:24
+zvpt:f:a0:1:
+zvpt:a:b0:3000:2000
+zvpt:a:a0:2000:16
+zvpt:a:a0:1000:8
+zvpt:d:b0
+zvpt:f:c0:1000:
+zvpt:f:a0:1000:
+zvpt:c:\tx
+zvpt:a:a0:3000:9"""
+# Arguments, input, status, output, and what the error stream says behind the program's name. A star
+# stands for any text.
+COMMANDS = [
+    ("", "", 2, "", "A subcommand is required" + USAGE),
+    ("--help", "", 0, "*SUBCOMMAND --help*", ""),
+    *((f"{name} --help", "", 0, "*Example: *", "") for name in ("report", "picture", "trace")),
+    ("report --no-such", "", 2, "", "*--no-such" + USAGE),
+    ("report --json --check", "", 2, "", "*[--summary,--json,--check,--text]" + USAGE),
+    ("report /no/such", "", 1, "", "/no/such: can't be opened: No such file or directory\n"),
+    ("report /", "", 1, "", "/: can't be read: Is a directory\n"),
+    ("report", "", 1, "", "-: there is no report in it\n"),
+    ("report --from-json", "{", 1, "", "-: not a document of reports: *"),
+    ("report --check -", DEMO, 0, "", ""),
+    ("report", DEMO.replace(" demo", " de\tmo") + DETAILED, 0, """\
+pool           used       free        ext    bytes held       payload    share
+de\\x09mo        508        280          2         19692          9860   50.1 %
+detailed         12         11          3      12349412      12348832  100.0 %
+""", ""),
+    ("report --check", DEMO.replace("  508\n", "  509\n"), 1,
+     "line 10: Used Recs is 509, not 508: the sum of Used in BUCKETS\n", "-: 1 breach\n"),
+    ("report --check", DEMO.replace(" 2000 ", " 2001 ", 1), 1,
+     "line *\nline *\n", "-: 2 breaches\n"),
+    ("picture report.txt", "", 2, "", "--output is required" + USAGE),
+    ("picture -o page.html", "", 2, "", "REPORT is required" + USAGE),
+    ("picture - -o -", DETAILED, 0, "<!DOCTYPE html>\n*</html>\n", ""),
+    ("picture - -o cut.html", DETAILED[:4000], 1, "", "-: line *: expected *"),
+    ("picture - -o plain.html", DEMO, 1, "", PLAIN + "; DbgDetailed writes them\n"),
+    ("picture - -o page.html", DEMO + DETAILED, 0, "", PLAIN + "\n"),
+    ("trace", "", 1, "", "-: there is no trace line in it\n"),
+    ("trace --bucket-size 9", "", 2, "", "--bucket-size requires --at" + USAGE),
+    ("trace --at 0", "", 2, "", "--at: Value 0 not in range*"),
+    ("trace --name cache", "", 2, "", "--name: takes POOL=NAME, *"),
+    ("trace --name a0=cache --massif massif", TRACE, 0, golden("trace"), ""),
+    ("trace --json --name a0=cache", TRACE, 0, golden("trace-json"), ""),
+    ("trace --at 8 --off", TRACE, 0, "*Enabled     :        0\n*", "*"),
+    ("trace --at 11 --name a0=cache --name=c0=\x01 --bucket-size 162 --max-record-size 60 "
+     "--min-record-size 9 --data-alignment 2 --keep-empty-buckets", TRACE, 0,
+     "MemPool::Mgr cache\n*Bucket Size :      162\n*Num Buckets :        1\n      Empty    : "
+     "       1\n*Min Rec Sz  :       10\n   Max Rec Sz  :       60\n   Data Align  :        2\n*",
+     "\\x01: its first lines are not in the trace\n"
+     "vokmempool: cache: a Clear lies between line 2 and line 6, the report is uncertain\n"
+     "vokmempool: 2 mixed or cut lines were passed over, the first is line 10\n"),
+    ("trace --at 12", TRACE, 1, "", "-: it has no line 12, only 11\n"),
+]
+
+
+# Shell commands, their output and their error stream.
+SHELL = [
+    ("vokmempool report --text > /dev/full", "", "*standard output: can't be written*"),
+    ("vokmempool report --text | head -1", "MemPool::Mgr demo\n", ""),
+    ("trap '' PIPE; vokmempool report --text | head -1", "MemPool::Mgr demo\n", ""),
+    ("{ sleep 2.1; echo zvpt:c:a0; } | vokmempool trace | head -1", "1 lines, 1 *", ""),
+    ("script -qec '{ sleep 2.1; echo zvpt:c:a0; } | vokmempool trace' /dev/null < /dev/null",
+     "\r0 MB read\x1b[K\r\x1b[K1 lines*", ""),
+]
+
+
+def is_like(text, form):
+    """Whether the pieces of a form stand in a text one behind the other, with no rest."""
+    first, *pieces = form.split("*")
+    end = len(first) if text.startswith(first) else -1
+    for piece in pieces:
+        found = text.find(piece, end) if end >= 0 else -1
+        end = found + len(piece) if found >= 0 else -1
+    return end == len(text) or end >= 0 and form.endswith("*")
+
+
+def test_commands():
+    for arguments, given, status, output, errors in COMMANDS:
+        found = run(PROGRAM, *shlex.split(arguments), given=given)
+        errors = errors and f"vokmempool: {errors}"
+        same((is_like(found[0], output), is_like(found[1], errors), found[2]),
+             (True, True, status), f"{arguments}: {found}")
+    same(sorted(os.listdir()), ["massif", "page.html"], "the written files")
+    same(Path("massif").read_text(), golden("massif"), "the samples")
+    for command, output, errors in SHELL:
+        found = run("bash", "-c", command.replace("vokmempool", PROGRAM), given=DEMO * 400)
+        same((is_like(found[0], output), is_like(found[1], errors)), (True, True),
+             f"{command}: {found}")
+
+
+# What other states of a stream make of a report, what damage of a pool does, and what cuts
+# leave: a text, what stands there instead, and the message.
+NUMBER = "expected a decimal number up to 4294967295 at the right of 8 columns in column 18, "
+CHANGES = [
+    (" :       14\n", " :        e\n", "line 6: " + NUMBER),
+    (" :       88\n", " : 88      \n", "line 4: " + NUMBER),
+    (" :       88\n", " : ******88\n", "line 4: " + NUMBER),
+    (" :       88\n", " :      088\n", "line 4: " + NUMBER),
+    (" :       88\n", " :        88\n", "line 4: " + NUMBER),
+    (" :       88\n", " : 4294967296\n", "line 4: " + NUMBER),
+    ("Enabled     :        1\n", "Enabled     :     true\n", "line 15: " + NUMBER),
+    (" 25.000%", "25.0000%", "line 40: expected a number with three decimals at the right of 7"),
+    (" 25.000%", "  25.00%", "line 40: expected a number with three decimals at the right of 7"),
+    ("+---------+\n", "+\n", "line 103: expected a rule over 8 boxes"),
+    ("| FREE    | \n", "| FREE    | FREE    | \n", "line 104: expected the end of the line"),
+    ("#002\n", "#02\n", "expected a number filled with zeros to 3 columns in column 21"),
+    ("#002\n", "#0002\n", "expected a number filled with zeros to 3 columns in column 21"),
+    ("Next1       :        0", "Next1       :      0x0", "expected an address at the right of 8"),
+    ("Exp $\n", "Exp $\r\n", "line 2: expected a line end of CR and LF in front of this"),
+    ("MemPool::Mgr", "MemPool::Mgr x\nMemPool::Mgr", "line 2: expected \"   Version     : \","),
+    ("Enabled     :        1\n", "Enabled     :        0\n", "line 15: Enabled is 0, and the pool"),
+    ("***\n", "***+\n", "line 30: the bar has a \"+\"\n"),
+    ("228 \n\n", "228 \nWARNING:../s/MemPool:  110: Number of recs 7 < 8\n\n",
+     "line 95: the library warns of what it found"),
+    (" 0 \n\n\n   MemPool::Bucket #002", " 0 \nWARNING:../s/MemPool:12345: Too many free recs "
+     "7 > 6\n\n\n   MemPool::Bucket #002", "line 119: the library warns of what it found"),
+]
+
+
+def messages_on(text, line, *options):
+    """The messages on a text without their values, each with whether it names that line."""
+    output, errors, _ = run(PROGRAM, "report", "--check", *options, given=text)
+    errors = re.split(r", found |\[json", errors)[0].removeprefix("vokmempool: -: ")
+    errors = re.sub(r"\d+ breach.*\n", "", errors)
+    for message in (output + errors).splitlines() or ["nothing"]:
+        _, number, message = re.fullmatch("(line (\\d+): )?(.*)", message).groups()
+        yield re.sub('".*"|0x[0-9a-f]+|\\d+', "#", message), number == str(line)
+
+
+def changed_reports():
+    """The line and the text of a change: every second value is another one of its width, every
+    second line is gone, and the end is."""
+    others = {"USED": "UNKN", "FREE": "USED", " + ": "   ", "9": "8", "f": "e"}
+    places = re.finditer(r"(?<![\w.])(?:0x[0-9a-f]+|\d+)|USED|FREE|\*+| \+ ", DETAILED)
+    for found in list(places)[::2]:
+        old, line = found[0], DETAILED.count("\n", 0, found.start()) + 1
+        new = others.get(old) or old[:-1] + (others.get(old[-1]) or chr(ord(old[-1]) + 1))
+        yield line, DETAILED[:found.start()] + new + DETAILED[found.end():]
+    lines = DETAILED.splitlines(True)
+    for i in range(0, len(lines), 2):
+        yield i + 1, "".join(lines[:i] + lines[i + 1:])
+    for end in range(0, len(DETAILED), 97):
+        yield DETAILED.count("\n", 0, end) + 1, DETAILED[:end]
+
+
+def changed_documents(document):
+    """Of each key once: another name, and other values."""
+    for key in sorted(set(re.findall('"(\\w+)":', document))):
+        start, name, value, end = re.search(
+            f'^(.*?")({key}":\\[?)("[^"]*"|[\\w.]+)?(.*)$', document, re.S).groups()
+        yield f"{start}_{name}{value or ''}{end}"
+        for other in ("-1", "0", "101", "4294967296", '"0xx"', f"{value},{value}") if value else ():
+            yield start + name + other + end
+
+
+def test_changes():
+    """The golden text has each message, how often it names the line of the change, and how often
+    not."""
+    for old, new, message in CHANGES:
+        text = DETAILED.replace(old, new, 1)
+        output, errors, _ = run(PROGRAM, "report", "--check", given=text)
+        same(message in output + errors, True, f"{new!r}: {output}{errors}, expected {message}")
+        if output:
+            data_of(text)
+    messages = Counter()
+    for line, text in changed_reports():
+        messages.update(messages_on(text, line))
+    for document in changed_documents(tool("report", "--json", given=DETAILED)):
+        messages.update(messages_on(document, 0, "--from-json"))
+    text = "".join(f"{messages[form, True]:5} {messages[form, False]:5} {form}\n"
+                   for form in sorted({form for form, _ in messages}))
+    if "VOK_MEMPOOL_APPROVE" in os.environ:
+        (GOLDEN / "tools/messages.txt").write_text(text)
+    same(text, golden("messages"), "the messages")
+
+
+NAMES = ("", "two\nlines", "caf\xe9", "\xe2\x82\xac", '"\\\t', "MemPool", "cache")
+
+
+def numbered(text):
+    """A text with its addresses replaced by their number of first sight."""
+    numbers = {}
+    return re.sub(" *0x[0-9a-f]+",
+                  lambda found: f" @{numbers.setdefault(found[0].strip(), len(numbers))}", text)
+
+
+def test_library():
+    """Whatever the library prints the program takes, gives back, finds sound and can repeat."""
+    for path, text in REPORTS.items():
+        if text.startswith("MemPool::Mgr "):
+            data_of(text)
+    for seed in range(40):
+        draw = random.Random(seed)
+        names, clears, off = draw.sample(NAMES, 2), seed % 3 == 2, seed % 20 == 19
+        work = Work(seed, draw.randrange(2, 900), int(clears), names, int(off))
+        first, second = work.reports
+        front = "" if "two\nlines" in names else "and on: "  # a title in a line must be a whole one
+        text = f"MemPool\n\n{front}{first}{work.output}"
+        same(tool("report", "--text", given=text), first + first + second, "reports in an output")
+        same(run(PROGRAM, "report", "--check", given=text), ("", "", 0), f"seed {seed}")
+        data_of(first.replace("\n", "\r\n"))
+        data = data_of(second)
+        found = [bytes.fromhex(pool["nameBytes"]) if "nameBytes" in pool
+                 else pool["name"].encode("latin-1") for pool in data]
+        same(sorted(found), sorted(name.encode("latin-1") for name in names), "the names")
+        if off:
+            continue
+        trace = work.output[:work.ends[1]]
+        named = [f"--name={addr}={name}"
+                 for addr, name in zip(re.findall("^zvpt:c:(.*)", trace, re.M), names)]
+        if not clears:
+            again = tool("trace", "--detailed", "--at", trace.count("\n"), *named,
+                         given=work.output, keys=work.keys)
+            same(numbered(again), numbered(second), f"seed {seed}")
+        used = {int(row["data"], 16): row["length"]
+                for pool in data for row in pool["extRecs"]["rows"]}
+        used.update({int(row["addr"], 16) + 4: row["dataSize"]
+                     for pool in data for bucket in pool["bucketReports"]
+                     for row in bucket["records"]["rows"] if row["type"] == "USED"})
+        live = json.loads(tool("trace", "--json", given=trace))["live"]
+        certain = {int(row["data"], 16): row["size"] for row in live if not row["uncertain"]}
+        same(certain.keys() <= used.keys() and (clears or certain.keys() == used.keys()), True,
+             f"the live records of seed {seed}")
+        same([data for data in certain if certain[data] > used[data]], [], "sizes")
+
+
+EVENTS = ("zvpt:c:5581c0de", "zvpt:d:003a1f40\r", "zvpt:a:1:ffffffffffffffff:1073741823",
+          "zvpt:a:1:2:0", "zvpt:f:1:2:")
+MIXED = ("zvpt:a:1:2:1073741824", "zvpt:a:1:2:007", "zvpt:a:1:2:1,000", "zvpt:a:1:2:",
+         "zvpt:f:1:2:3", "zvpt:a:1:10000000000000000:4", "zvpt:a:1F:2:4", "zvpt:c:", "zvpt:c:1:",
+         "zvpt:e:1", "zvpt:zvpt:a:1:2:4", "ready zvpt:c:1", 300 * "x" + "zvpt:")
+OTHER = ("zvpt", "")
+
+
+def lines_at_random(draw, steps, wild):
+    """Trace lines: requests of fresh addresses and Frees of live ones, but a share of anything."""
+    held, lines = [], []
+    for step in range(steps):
+        pool = draw.choice(("a0", "b0", "c0"))
+        if draw.random() < wild:
+            data = draw.choice(held)[1] if held else "5"
+            lines.append(draw.choice(EVENTS + MIXED + OTHER + 4 * (
+                f"zvpt:c:{pool}", f"zvpt:d:{pool}", f"zvpt:a:{pool}:{data}:{step % 30}",
+                f"zvpt:f:{pool}:{data}:")))
+        elif not held or draw.random() < .65:
+            held.append((pool, f"{step * 16 + 16:x}"))
+            lines.append("zvpt:a:{}:{}:{}".format(*held[-1], draw.randrange(100)))
+        else:
+            lines.append("zvpt:f:{}:{}:".format(*held.pop(draw.randrange(len(held)))))
+    return lines
+
+
+def literal(lines):
+    """The bytes behind each event, and what --json says of the lines, by walks over plain lists."""
+    pools, live, refused, course, at = {}, {}, [], [0], [None]
+    sizes, lifetimes, numbers = Counter(), Counter(), Counter()
+    for number, line in enumerate(lines, 1):
+        if line in MIXED + OTHER:
+            continue
+        letter, addr, data, size, *_ = line.rstrip("\r")[5:].split(":") + ["", ""]
+        addr, old = addr.lstrip("0"), live.get(data)
+        if letter == "d" or letter == "c" and addr in pools:
+            numbers["gone"] += 1
+            pools.pop(addr, None)
+            live = {data: record for data, record in live.items() if record["pool"] != addr}
+        numbers["made"] += letter == "c"
+        if letter != "d":
+            pool = pools.setdefault(addr, {"pool": addr, "made": number if letter == "c" else None,
+                                           "requests": 0, "frees": 0, "clears": []})
+        if letter == "a":
+            clears = pools[old["pool"]]["clears"] if old else []
+            if old and old["uncertain"]:
+                clears[-1]["after"] = max(clears[-1]["after"], old["line"])
+            elif old:
+                numbers["clears"] += 1
+                clears.append({"after": old["line"], "before": number})
+                for record in live.values():
+                    record["uncertain"] |= record["pool"] == old["pool"]
+            live.pop(data, None)
+            live[data] = {"line": number, "pool": addr, "data": data, "size": int(size),
+                          "uncertain": False, "event": len(course)}
+            sizes[int(size)] += 1
+            pool["requests"] += 1
+        elif letter == "f" and old and old["pool"] == addr:
+            pool["frees"] += 1
+            if not old["uncertain"]:
+                lifetimes[1 << (len(course) - old["event"]).bit_length() - 1] += 1
+            del live[data]
+        elif letter == "f":
+            refused.append({"line": number, "pool": addr, "data": data,
+                            "liveIn": old and old["pool"]})
+        course.append(sum(record["size"] for record in live.values() if not record["uncertain"]))
+        at.append(number)
+    for record in live.values():
+        del record["event"]
+    for addr, pool in pools.items():
+        for doubt, keys in ((False, ("records", "bytes")),
+                            (True, ("uncertainRecords", "uncertainBytes"))):
+            held = [record["size"] for record in live.values()
+                    if record["pool"] == addr and record["uncertain"] == doubt]
+            pool.update(zip(keys, (len(held), sum(held))))
+    mixed = [{"line": number, "text": line[:200]} for number, line in enumerate(lines, 1)
+             if line in MIXED]
+    return course, {
+        **{key: numbers[key] for key in ("made", "gone", "clears")}, "events": len(course) - 1,
+        "bytes": course[-1], "peakBytes": max(course), "peakLine": at[course.index(max(course))],
+        "mixed": len(mixed), "mixedLines": mixed[:100], "live": list(live.values()),
+        "refused": len(refused), "refusedFrees": refused[:100],
+        "sizes": [{"size": size, "requests": sizes[size]} for size in sorted(sizes)],
+        "lifetimes": [{"from": least, "records": lifetimes[least]} for least in sorted(lifetimes)],
+        "standingPools": sorted(pools.values(),
+                                key=lambda pool: (pool["made"] or 0, int(pool["pool"], 16)))}
+
+
+def test_trace():
+    for seed in range(30):
+        draw = random.Random(seed)
+        lines = lines_at_random(draw, draw.randrange(1, 600) if seed else 5000,
+                                draw.choice((.02, .1, .5)) if seed else .02)
+        course, expected = literal(lines)
+        text = "".join(f"{line}\n" for line in lines)
+        found = json.loads(tool("trace", "--json", "--massif", "massif", given=text))
+        found["standingPools"] = [{key: pool[key] for key in pool if key in expected_pool}
+                                  for pool, expected_pool in zip(found["standingPools"],
+                                                                 expected["standingPools"])]
+        for key in expected:
+            same(found[key], expected[key], f"seed {seed}: {key}")
+        massif = Path("massif").read_text()
+        samples = [(int(time), int(held)) for time, held in re.findall(
+            "^time=(\\d+)\nmem_heap_B=(\\d+)$", massif, re.M)]
+        same(samples, [(time, course[time]) for time in sorted(dict(samples))], "samples")
+        same((min(len(course), 50) <= len(samples) <= 102, samples[-1][0]), (True, len(course) - 1),
+             f"{len(samples)} samples")
+        at_peak = sum(map(int, re.findall("^ n0: (\\d+) pool ", massif, re.M)))
+        same((at_peak, max(dict(samples).values())), (max(course), max(course)), "the peak")
+
+
+with tempfile.TemporaryDirectory() as folder:
+    os.chdir(folder)
+    test_commands()
+    test_changes()
+    test_library()
+    test_trace()
