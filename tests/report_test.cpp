@@ -2,7 +2,7 @@
 // the stream or a damage changes in them. The pools stand on an arena, so that addresses are the
 // same in every run.
 #include "support/ArenaHeap.h"
-#include "support/Script.h"
+#include "support/Process.h"
 
 #include "MemPool"
 #include "engine/Bucket.h"

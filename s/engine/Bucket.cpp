@@ -1,5 +1,5 @@
 // Construction and destruction of a bucket, and the way back from a pointer.
-// Test: tests/bucket_test.cpp.
+// Test: tests/bucketmgr_test.cpp, tests/model_test.cpp.
 #include "engine/Bucket.h"
 
 #include "engine/KeepStores.h"

@@ -1,6 +1,6 @@
 // A bucket: one heap block with a header and equal records, chained by 16-bit offsets that live in
 // the records themselves. It knows its records and nothing of lists beyond its own four links.
-// Test: tests/bucket_test.cpp.
+// Test: tests/bucketmgr_test.cpp, tests/model_test.cpp.
 #ifndef VOK_MEMPOOL_BUCKET_H
 #define VOK_MEMPOOL_BUCKET_H
 

@@ -1,5 +1,5 @@
 // Construction and release of buckets, and the two lists: the slow paths of a Group.
-// Test: tests/group_test.cpp.
+// Test: tests/model_test.cpp.
 #include "engine/Group.h"
 
 #include <cassert>

@@ -1,6 +1,6 @@
 // One size class of one pool: its buckets on two lists, all of them and those with a free record.
 // It decides which bucket serves, when one is made and when one returns to the heap.
-// Test: tests/group_test.cpp.
+// Test: tests/model_test.cpp.
 #ifndef VOK_MEMPOOL_GROUP_H
 #define VOK_MEMPOOL_GROUP_H
 

@@ -1,6 +1,6 @@
 // Stores to an object whose life or memory ends next. The compiler takes them for dead and drops
 // them; a stale pointer to the object must find them done all the same.
-// Test: tests/bucket_test.cpp, tests/reentry_test.cpp.
+// Test: tests/bucketmgr_test.cpp, tests/reentry_test.cpp.
 #ifndef VOK_MEMPOOL_KEEPSTORES_H
 #define VOK_MEMPOOL_KEEPSTORES_H
 

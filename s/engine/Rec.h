@@ -1,7 +1,7 @@
 // A record's header: 4 bytes in front of the data that the caller holds. In a free record they
 // chain the free list, in a used one they lead back to the bucket. A record has no alignment
 // beyond what its size gives it, so the header is declared in bytes, low byte first everywhere.
-// Test: tests/bucket_test.cpp.
+// Test: tests/bucketmgr_test.cpp, tests/model_test.cpp.
 #ifndef VOK_MEMPOOL_REC_H
 #define VOK_MEMPOOL_REC_H
 

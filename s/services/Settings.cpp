@@ -1,5 +1,5 @@
 // The table of environment keys and its reader, the banner, and the exported functions.
-// Test: tests/settings_test.cpp, tests/process_test.py.
+// Test: tests/model_test.cpp, tests/process_test.py.
 #include "services/Settings.h"
 
 #include "MemPool"

@@ -1,6 +1,6 @@
 // The process-wide settings. A pool copies them when it is built. They are plain variables with no
 // lock, and have no end of their own. The trace switch, which each event reads, is a bit of the
-// byte that every request tests (services/Observers.h). Test: tests/settings_test.cpp,
+// byte that every request tests (services/Observers.h). Test: tests/model_test.cpp,
 // tests/process_test.py.
 #ifndef VOK_MEMPOOL_SETTINGS_H
 #define VOK_MEMPOOL_SETTINGS_H

@@ -6,13 +6,12 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <functional>
 #include <map>
 #include <string>
 #include <vector>
 
-/// A fresh arena, for as long as the object lives; one at a time. Blocks come filled with
-/// `delivered`, and between guards. As on many a heap, the last 4 bytes in front of a block hold
+/// A fresh arena, for as long as the object lives; one at a time. Blocks are filled with
+/// `delivered` and lie between guards. As on many a heap, the last 4 bytes before a block hold
 /// its size, low byte first: for 65536 bytes and more they read like a used record's header.
 class ArenaHeap {
 public:
@@ -21,16 +20,16 @@ public:
     char kind; ///< '+' allocated, '-' released, '!' failed
     Form form;
     std::size_t size;
-    const void* block; ///< null where it failed
+    const void* block;               ///< null where it failed
+    std::vector<std::uint8_t> bytes; ///< of a block that is released, as it was
   };
 
   static constexpr unsigned char delivered = 0xDB; ///< fills a new block
   static constexpr unsigned char released = 0xDD;  ///< fills a released one
 
-  std::vector<Event> events;               ///< all since a test emptied it
-  std::vector<std::string> faults;         ///< wrong forms, wrong sizes, broken guards, strays
-  std::function<void(const Event&)> watch; ///< sees a block's bytes before it is released
-  unsigned numCalls = 0;                   ///< allocations asked for, failed ones included
+  std::vector<Event> events;       ///< all since a test emptied it
+  std::vector<std::string> faults; ///< wrong forms, wrong sizes, broken guards, strays
+  unsigned numCalls = 0;           ///< allocations asked for, failed ones included
 
   ArenaHeap();
   ~ArenaHeap();
@@ -43,23 +42,18 @@ public:
   public:
     explicit Use(bool arena = true);
     ~Use();
-    Use(const Use&) = delete;
-    Use& operator=(const Use&) = delete;
 
   private:
     const bool before;
   };
 
-  /// The `k`-th allocation from now throws bad_alloc, and all later ones if `andLater`; with a `k`
-  /// of 0 none does.
-  void FailAt(unsigned k, bool andLater = false);
+  /// The `k`-th allocation from now throws bad_alloc, with a `k` of 0 none does.
+  void FailAt(unsigned k) { failIn = k; }
 
-  /// Adds the blocks that still stand to the faults, and returns all of them.
+  /// Adds the live blocks to the faults, and returns all of them.
   const std::vector<std::string>& Finish();
 
-  static bool Holds(std::uintptr_t address);
-
-  /// Lifts what the checkers hold of these bytes, so that a test may look at what is nobody's.
+  /// Unpoisons these bytes for the memory-checking tools, so that a test may read free records.
   static void Open(const void* from, std::size_t size);
 
   void* Take(std::size_t size, Form form);
@@ -71,14 +65,15 @@ private:
     std::size_t size;
   };
 
-  void Fault(const char* what, const void* p, const Block& block);
-  void CheckGuards(const void* p, const Block& block);
+  void Fault(const std::string& what, std::size_t size) {
+    faults.push_back(what + ": a block of " + std::to_string(size) + " bytes");
+  }
+  void CheckGuards(std::byte* p, const Block& block);
 
   std::byte* end; // of what was ever taken, behind the last guard
-  std::map<const void*, Block> live;
+  std::map<std::byte*, Block> live;
   std::map<std::size_t, std::vector<std::byte*>> spare; // by their room
   unsigned failIn = 0;
-  bool failLater = false;
 };
 
 #endif
