@@ -116,6 +116,7 @@ constexpr struct {
     {"trace", [](State& s) { ZOR_VOK_MEMPOOL_TRACE(s.operand == "1"); }},
     {"pool", [](State& s) { s.pools.push_back(new Mgr(s.operand.c_str())); }},
     {"nameless", [](State& s) { s.pools.push_back(new Mgr); }},
+    {"turn", [](State& s) { std::reverse(s.pools.begin(), s.pools.end()); }},
     {"drop", [](State& s) { delete &s.Pool(), s.pools.pop_back(); }},
     {"clear", [](State& s) { s.Pool().Clear(); }},
     {"report", [](State& s) { s.Pool().DbgDetailed(); }},
@@ -142,7 +143,7 @@ void Run(const std::string& script) {
     std::istringstream words(part);
     std::string name;
     ownState.operand.clear();
-    words >> name >> ownState.operand;
+    std::getline(words >> name >> std::ws, ownState.operand, '\0');
     const char* caught = nullptr;
     try {
       if (!Act(name, ownState) && actOfClient != nullptr) actOfClient(name, ownState);
