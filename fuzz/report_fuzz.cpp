@@ -10,6 +10,7 @@
 #include "ReportWriter.h"
 #include "Target.h"
 
+#include <cstdlib>
 #include <string>
 
 using namespace VOK::MemPool::Tools;
@@ -21,15 +22,15 @@ void ReadText(const std::string& input) {
   std::string json;
   WriteJson(reports, [&](std::string_view piece) { json += piece; });
   const std::vector<Report> again = ReadJson(json);
-  Demand(again.size() == reports.size());
-  for (std::size_t i = 0; i < reports.size(); ++i) {
+  bool isSame = again.size() == reports.size();
+  for (std::size_t i = 0; isSame && i < reports.size(); ++i) {
     const std::string text = WriteReport(reports[i]);
-    Demand(input.find(text) != std::string::npos && WriteReport(again[i]) == text);
+    isSame = input.find(text) != std::string::npos && WriteReport(again[i]) == text;
     CheckReport(reports[i]);
   }
-  Demand(!Summarise(reports).empty());
+  Summarise(reports);
   const PictureSource source{"fuzz", reports};
-  Demand(PictureData(&source, source).find('<') == std::string::npos);
+  if (!isSame || PictureData(&source, source).find('<') != std::string::npos) std::abort();
 }
 
 } // namespace
