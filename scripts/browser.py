@@ -1,55 +1,46 @@
 """A page in headless chromium, driven over a pair of pipes: evaluate, press keys, take pictures."""
 import base64
 import json
-import os
 import subprocess
 import tempfile
+from pathlib import Path
 
 
 class Browser:
     """One page of one browser. `messages` has what its console and its errors said."""
 
-    def __init__(self, program="chromium", width=1280, height=900, scale=1):
+    def __init__(self, program="chromium", height=900):
         self.messages = []
         self.count = 0
         self.folder = tempfile.TemporaryDirectory(ignore_cleanup_errors=True)
-        theirs_in, self.to = os.pipe()
-        self.back, theirs_out = os.pipe()
-
-        def place_pipes():  # the browser reads from 3 and writes on 4
-            read, write = os.dup(theirs_in), os.dup(theirs_out)
-            os.dup2(read, 3)
-            os.dup2(write, 4)
-
+        # The browser reads from 3 and writes on 4.
         self.process = subprocess.Popen(
-            [program, "--headless", "--no-sandbox", "--disable-gpu", "--remote-debugging-pipe",
+            ["sh", "-c", 'exec "$0" "$@" 3<&0 4>&1 </dev/null >/dev/null 2>&1', program,
+             "--headless", "--no-sandbox", "--disable-gpu", "--remote-debugging-pipe",
              f"--user-data-dir={self.folder.name}", "--hide-scrollbars", "about:blank"],
-            preexec_fn=place_pipes, close_fds=False, stderr=subprocess.DEVNULL)
-        os.close(theirs_in)
-        os.close(theirs_out)
-        self.replies = os.fdopen(self.back, "rb")
-        self.session = None
+            stdin=subprocess.PIPE, stdout=subprocess.PIPE)
+        self.session = {}
         targets = self.call("Target.getTargets")["targetInfos"]
         page = next(target["targetId"] for target in targets if target["type"] == "page")
-        self.session = self.call("Target.attachToTarget", targetId=page, flatten=True)["sessionId"]
+        attached = self.call("Target.attachToTarget", targetId=page, flatten=True)
+        self.session = {"sessionId": attached["sessionId"]}
         for domain in ("Page", "Runtime", "Log", "Network"):
             self.call(f"{domain}.enable")
-        self.resize(width, height, scale)
+        self.call("Emulation.setDeviceMetricsOverride", width=1280, height=height,
+                  deviceScaleFactor=1, mobile=False)
 
     def __enter__(self):
         return self
 
     def __exit__(self, *_):
         self.process.terminate()
-        self.process.wait()
-        os.close(self.to)
-        self.replies.close()
+        self.process.communicate()
         self.folder.cleanup()
 
     def read(self):
         text = b""
         while not text.endswith(b"\0"):
-            byte = self.replies.read(1)
+            byte = self.process.stdout.read(1)
             if not byte:
                 raise RuntimeError("the browser has ended")
             text += byte
@@ -65,10 +56,9 @@ class Browser:
 
     def call(self, method, **params):
         self.count += 1
-        message = {"id": self.count, "method": method, "params": params}
-        if self.session:
-            message["sessionId"] = self.session
-        os.write(self.to, json.dumps(message).encode() + b"\0")
+        message = {"id": self.count, "method": method, "params": params, **self.session}
+        self.process.stdin.write(json.dumps(message).encode() + b"\0")
+        self.process.stdin.flush()
         while True:
             reply = self.read()
             if reply.get("id") == self.count:
@@ -76,17 +66,9 @@ class Browser:
                     raise RuntimeError(f"{method}: {reply['error']['message']}")
                 return reply["result"]
 
-    def resize(self, width, height, scale=1):
-        self.call("Emulation.setDeviceMetricsOverride", width=width, height=height,
-                  deviceScaleFactor=scale, mobile=False)
-
-    def set_scheme(self, scheme):
-        self.call("Emulation.setEmulatedMedia",
-                  features=[{"name": "prefers-color-scheme", "value": scheme}])
-
     def open(self, path):
         """Opens a file and waits until it is drawn."""
-        self.call("Page.navigate", url=f"file://{os.path.abspath(path)}")
+        self.call("Page.navigate", url=Path(path).resolve().as_uri())
         while self.read().get("method") != "Page.loadEventFired":
             pass
         self.settle()
@@ -122,5 +104,4 @@ class Browser:
 
     def screenshot(self, path):
         picture = self.call("Page.captureScreenshot", format="png")["data"]
-        with open(path, "wb") as file:
-            file.write(base64.b64decode(picture))
+        Path(path).write_bytes(base64.b64decode(picture))

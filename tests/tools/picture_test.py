@@ -20,10 +20,8 @@ LINKS = """pools.map((pool) => pool.buckets.map((bucket) => [...bucket.unpacked.
   .map((i) => [bucket.offsetOf(i), bucket.unpacked.next[i], bucket.addressOf(i)])))"""
 CHANGES = """pools.map((pool) => [pool.came, pool.went,
   pool.buckets.map(countLooks).reduce((sum, looks) => sum + looks.came, 0)])"""
-CORNER = """(() => {
-  const box = document.querySelector('.strips canvas').getBoundingClientRect();
-  return [box.left + 3, box.top + 10];
-})()"""
+CORNER = """[document.querySelector('.strips canvas').getBoundingClientRect()]
+  .flatMap((box) => [box.left + 3, box.top + 10])"""
 
 
 def draw(browser, *reports):
@@ -70,11 +68,11 @@ def test_one(browser, text):
     tip_has(f"offset\n{bucket['freeList']['rows'][0]['next']} to", "n")
     tip_has("hidden", "Escape")
     x, y = browser.evaluate(CORNER)
-    for move, part in ((lambda: browser.move(1, 1), "hidden"),
-                       (lambda: browser.move(x, y), f"record 1 of {len(rows)}\n"),
-                       (lambda: browser.move(1, 1), "hidden"),
-                       (lambda: browser.tap(x + 12, y), f"record 4 of {len(rows)}\n")):
-        move()
+    for point, move, part in (((1, 1), browser.move, "hidden"),
+                              ((x, y), browser.move, f"record 1 of {len(rows)}\n"),
+                              ((1, 1), browser.move, "hidden"),
+                              ((x + 12, y), browser.tap, f"record 4 of {len(rows)}\n")):
+        move(*point)
         tip_has(part)
     browser.evaluate("document.querySelector('.head').querySelectorAll('button')[2].focus()")
     browser.press("Enter")
@@ -120,13 +118,9 @@ def test_many(browser):
     same(("10000" in rows[-1:], len(rows) < 200), (True, True), f"rows in view: {rows}")
 
 
-def main():
-    before, now = Work(116, 3000, names=("</script><b>", "second")).reports
-    with tempfile.TemporaryDirectory() as folder, Browser(sys.argv[3]) as browser, chdir(folder):
-        test_one(browser, now)
-        test_pair(browser, before, now)
-        test_many(browser)
-        same(browser.messages, [], "messages in the console")
-
-
-main()
+half_time, end = Work(116, 3000, names=("</script><b>", "second")).reports
+with tempfile.TemporaryDirectory() as folder, Browser(sys.argv[3]) as chromium, chdir(folder):
+    test_one(chromium, end)
+    test_pair(chromium, half_time, end)
+    test_many(chromium)
+    same(chromium.messages, [], "messages in the console")
