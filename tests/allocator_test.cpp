@@ -191,16 +191,11 @@ void MakeAll(Mgr& pool) {
   ExpectEmpty(Nut<N, on>::Pool());
 }
 
-template <std::size_t... n>
-void MakeAll(Mgr& pool, std::index_sequence<n...>) {
-  if (pool.IsEnabled())
-    (MakeAll<1 << n, true>(pool), ...);
-  else
-    (MakeAll<1 << n, false>(pool), ...);
-}
-
 TEST(Adaptors, MakeAndDestroy) {
-  ForEachSetting([](Mgr& pool) { MakeAll(pool, std::make_index_sequence<7>()); });
+  const auto makeAll = []<int... n>(Mgr & pool, std::integer_sequence<int, n...>) {
+    pool.IsEnabled() ? (MakeAll<1 << n, true>(pool), ...) : (MakeAll<1 << n, false>(pool), ...);
+  };
+  ForEachSetting([&](Mgr& pool) { makeAll(pool, std::make_integer_sequence<int, 7>()); });
 }
 
 TEST(Adaptors, RefuseWhatWouldEndTheProcess) {

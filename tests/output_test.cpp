@@ -72,6 +72,7 @@ TEST(OutputLine, HasTheTextOfInsertions) {
       }
 }
 
+// And a line that can't be written hides no failure to load.
 TEST(OutputLine, ChangesNothingButAPendingWidth) {
   for (const bool dies : {false, true}) {
     std::ostringstream tied;
@@ -83,30 +84,19 @@ TEST(OutputLine, ChangesNothingButAPendingWidth) {
     std::cout << std::hex << std::setfill('*') << std::setw(9);
     std::cout.tie(&tied);
     const std::ios::fmtflags flags = std::cout.flags();
+    const Buffer errors(std::cerr);
     const unsigned before = numAllocations;
     dead = dies;
     EXPECT_NO_THROW(Trace::Freed(nullptr, nullptr));
     EXPECT_NO_THROW(Messages::Warning({0x123u}, 0xABC));
+    EXPECT_THROW(Messages::RefuseLoad({"reason ", 7u}), const char*);
     dead = false;
     EXPECT_EQ(numAllocations, before);
     EXPECT_EQ(buffer.text, dies ? "" : "****zvpt:f:0:0:\nWARNING:../s/MemPool:a.b.c: 1.2.3\n");
+    EXPECT_THAT(errors.text, testing::EndsWith(dies ? "" : ": reason 7\n"));
     EXPECT_EQ(tiedBuffer.numFlushes, 2u);
     EXPECT_TRUE(std::cout.good() && std::cout.flags() == flags && std::cout.width() == 0 &&
                 std::cout.fill() == '*' && std::cout.getloc() == locale && tied.good());
-  }
-}
-
-TEST(OutputLine, HidesNoLoadFailure) {
-  for (const bool dies : {false, true}) {
-    const Buffer buffer(std::cerr);
-    dead = dies;
-    try {
-      Messages::RefuseLoad({"reason ", 7u});
-    } catch (const char* text) {
-      EXPECT_THAT(std::string(text), testing::EndsWith(": reason 7"));
-      EXPECT_EQ(buffer.text, dies ? "" : std::string(text) + "\n");
-    }
-    dead = false;
   }
 }
 

@@ -32,24 +32,24 @@ INFO=0 ON=2 MAX_RECORD_SIZE=0 : say main -> banner 4010 4 0 0 8 0 0; !EXCEPTION 
 INFO=-1 MIN_RECORD_SIZE=-1 : say main -> !EXCEPTION 12: (4294967295>=1000); aborted
 
 # The ERROR lines of a handle, then those of a pool.
-ON=* TRACE=1 : pool a; max 5000; pool a -> zvpt:c:@1; ERROR 1: duplicate 'a'; status 1
+ON=* TRACE=1 : pool a; set max=5000; pool a -> zvpt:c:@1; ERROR 1: duplicate 'a'; status 1
 ON=* : pool __VOK_MEMPOOL_00001; nameless -> ERROR 1: duplicate '__VOK_MEMPOOL_00001'; status 1
 ON=* : grouping; pool a; alloc 4294967295 -> ERROR 2: limit 4294967295; status 1
 
-ON=* TRACE=1 : max 4294967295; pool a
+ON=* TRACE=1 : set max=4294967295; pool a
     -> zvpt:c:@1; ERROR 1: maximum (4294967292>4006) [4010]; status 1
-ON=* BUCKET_SIZE=70000 : max 65535; pool a -> ERROR 1: maximum (65532>65531) [65535]; status 1
+ON=* BUCKET_SIZE=70000 : set max=65535; pool a -> ERROR 1: maximum (65532>65531) [65535]; status 1
 ON=* BUCKET_SIZE=0 : pool a -> ERROR 1: maximum (1000>4294967292) [0]; status 1
-ON=* BUCKET_SIZE=1003 : min 2000; pool a -> ERROR 1: maximum (1000>999) [1003]; status 1
-ON=* : min 1001; pool a -> ERROR 2: minimum (1004>1000); status 1
-ON=* : min 4294967295; pool a -> ERROR 2: minimum (4294967296>1000); status 1
+ON=* BUCKET_SIZE=1003 : set min=2000; pool a -> ERROR 1: maximum (1000>999) [1003]; status 1
+ON=* : set min=1001; pool a -> ERROR 2: minimum (1004>1000); status 1
+ON=* : set min=4294967295; pool a -> ERROR 2: minimum (4294967296>1000); status 1
 
 # The last values that fit.
 ON=* : pool a; drop; pool a; alloc 1; free 0; alloc 1073741823; drop -> freed
-ON=* BUCKET_SIZE=70000 : max 65531; pool a; alloc 65524; free 0 -> freed
+ON=* BUCKET_SIZE=70000 : set max=65531; pool a; alloc 65524; free 0 -> freed
 
 # An ERROR line is whole before the exit, which runs what is queued for it.
-TRACE=1 ZOR_STATIC_POOLS=1 : pool a; max 3; pool b | names
+TRACE=1 ZOR_STATIC_POOLS=1 : pool a; set max=3; pool b | names
     -> zvpt:c:@1; zvpt:c:@2; zvpt:c:@3; zvpt:c:@4; ERROR 1: minimum (8>0);
     3 pools: __VOK_MEMPOOL_00001 a client; zvpt:d:@2; zvpt:d:@1; status 1
 ON=* TRACE=1 : pool a; alloc 1073741824 | cut -> zvpt:c:@1; ERROR 2: limit 1073741824; status 7
@@ -69,8 +69,8 @@ ON_LINUX = """
 pool_host ON=1 TRACE=1 ZOR_STATIC_POOLS=1 : open client; pool a | names; alloc 10; free 0; drop
     -> zvpt:c:@1; zvpt:c:@2; zvpt:c:@3; zvpt:d:@2; zvpt:d:@1; 0 pools:; zvpt:a:@3:@4:10;
     zvpt:f:@3:@4:; freed; zvpt:d:@3
-pool_host MIN_RECORD_SIZE=1000 ON=1 TRACE=1 : grouping; open library; open client; nameless; alloc 10
-    -> EXCEPTION 1: (1000>=1000); zvpt:c:@1; zvpt:a:@1:@2:10; !EXCEPTION 1: (1000>=1000)
+pool_host MIN_RECORD_SIZE=1000 ON=1 TRACE=1 : grouping; open library; open client; nameless;
+    alloc 10 -> EXCEPTION 1: (1000>=1000); zvpt:c:@1; zvpt:a:@1:@2:10; !EXCEPTION 1: (1000>=1000)
 ZOR_SHOW_KEYS=1 ON=0 : -> ON; ZOR_MEMPOOL_ON; TRACE; BUCKET_SIZE; MAX_RECORD_SIZE;
     MIN_RECORD_SIZE; DATA_ALIGNMENT; KEEP_EMPTY_BUCKETS; INFO
 """

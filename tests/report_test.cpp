@@ -18,11 +18,9 @@
 #include <gmock/gmock.h>
 #include <iomanip>
 #include <iostream>
-#include <map>
 #include <memory>
 #include <regex>
 #include <span>
-#include <sstream>
 
 using namespace VOK::MemPool;
 using testing::HasSubstr;
@@ -61,6 +59,10 @@ protected:
     const ArenaHeap::Use use;
     std::generate(blocks.begin(), blocks.end(), [&] { return pool.Alloc(size); });
     return blocks;
+  }
+
+  static void Write(const Mgr& pool, std::ostream& os) {
+    pool.GetBucketMgr()->Dbg(os, 6, true, true, true);
   }
 
   /// What `report` writes on standard output, messages with "#####" for their source line.
@@ -125,12 +127,11 @@ TEST_F(Reports, PoolInDetail) {
 
   // A report to a dead stream ends as any other. An exception comes through and nothing is left.
   std::ostream nowhere(nullptr);
-  const auto report = [&] { pool.GetBucketMgr()->Dbg(nowhere, 6, true, true, true); };
-  report();
+  Write(pool, nowhere);
   for (unsigned k = 1; k <= 40; ++k) {
     heap.FailAt(k);
     const ArenaHeap::Use use;
-    EXPECT_THROW(report(), std::bad_alloc);
+    EXPECT_THROW(Write(pool, nowhere), std::bad_alloc);
   }
 }
 
@@ -171,13 +172,12 @@ TEST_F(Reports, StateOfTheStream) {
   Make("idle");
   std::string changes;
   for (const auto& pool : pools) {
-    const auto write = [&pool](auto& os) { pool->GetBucketMgr()->Dbg(os, 2, true, true, true); };
     std::ostringstream plain;
-    write(plain);
+    Write(*pool, plain);
     for (const auto& [name, set] : states) {
       std::ostringstream os;
       set(os);
-      write(os);
+      Write(*pool, os);
       std::fesetround(FE_TONEAREST);
       const std::string report = os.str();
       os.str("");
@@ -198,9 +198,8 @@ TEST_F(Reports, DamagedBucket) {
   const std::span bytes(reinterpret_cast<std::uint8_t*>(&bucket), recsBaseOffset + bucket.recsSize);
   ArenaHeap::Open(bytes.data(), bytes.size());
   const std::vector<std::uint8_t> whole(bytes.begin(), bytes.end());
-  const auto write = [&](std::ostream& os) { pool.GetBucketMgr()->Dbg(os, 0, true, true, true); };
   std::ostringstream before;
-  write(before);
+  Write(pool, before);
 
   using Fields = std::map<std::string, std::uint16_t*>;
   const Fields fields{{"recsSize", &bucket.recsSize},
@@ -237,7 +236,7 @@ TEST_F(Reports, DamagedBucket) {
   for (std::string text; std::getline(damages, text, ',');) {
     damage(text);
     std::ostringstream os;
-    const std::string warnings = Report([&] { write(os); });
+    const std::string warnings = Report([&] { Write(pool, os); });
     changes += "== " + text + ", " + Changes(before.str(), os.str()) + warnings;
   }
   ExpectGolden("damages", changes);
@@ -251,7 +250,7 @@ TEST_F(Reports, DamagedBucket) {
          value += 1 + value / 300 * 99) {
       damage(place + " " + std::to_string(value));
       const std::vector<std::uint8_t> damaged(bytes.begin(), bytes.end());
-      write(std::cout);
+      Write(pool, std::cout);
       EXPECT_LT(std::exchange(output.flushes, 0), 600) << place << ' ' << value;
       EXPECT_TRUE(std::equal(damaged.begin(), damaged.end(), bytes.begin()));
       output.str("");

@@ -12,8 +12,6 @@
 #include <iostream>
 #include <memory>
 #include <new>
-#include <sstream>
-#include <string>
 #include <vector>
 
 #ifdef _WIN32
@@ -79,7 +77,7 @@ void Write(State& s) { static_cast<volatile char*>(s.blocks.back())[std::stol(s.
 void ShowNames(State&) {
   std::vector<Mgr*> mgrs;
   GetMgrs(mgrs);
-  std::cout << std::to_string(GetNumMgrs()) << " pools:";
+  std::cout << GetNumMgrs() << " pools:";
   for (const Mgr* mgr : mgrs)
     std::cout << ' ' << mgr->GetName();
   std::cout << std::endl;
@@ -96,8 +94,7 @@ constexpr struct {
     {"open", Open},
     {"close", [](State&) { dlclose(handle), actOfClient = nullptr; }},
 #ifndef VOK_MEMPOOL_HOST
-    {"max", [](State& s) { ZOR_VOK_MEMPOOL_MAX_RECORD_SIZE(s.Number()); }},
-    {"min", [](State& s) { ZOR_VOK_MEMPOOL_MIN_RECORD_SIZE(s.Number()); }},
+    {"set", [](State& s) { Set(s.operand); }},
     {"pool", [](State& s) { s.pools.push_back(new Mgr(s.operand.c_str())); }},
     {"nameless", [](State& s) { s.pools.push_back(new Mgr); }},
     {"drop", [](State& s) { delete &s.Pool(), s.pools.pop_back(); }},
@@ -127,15 +124,13 @@ void Run(const std::string& script) {
     std::string name;
     ownState.operand.clear();
     words >> name >> ownState.operand;
-    const char* caught = nullptr;
     try {
       if (!Act(name, ownState) && actOfClient != nullptr) actOfClient(name, ownState);
     } catch (const char* text) {
-      caught = text;
+      OverwriteStack();
+      std::cout << text << std::endl;
     } catch (const std::bad_alloc&) { // of a request that no test relies on
     }
-    OverwriteStack();
-    if (caught != nullptr) std::cout << caught << std::endl;
   }
 }
 
