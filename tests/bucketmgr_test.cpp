@@ -103,6 +103,13 @@ TEST_F(Pools, ClassBeyondTheTable) {
   for (std::size_t i = 0; i < 5000 / sizeof(void*); ++i)
     std::memcpy(after + i * sizeof(void*), &Bucket::FromData(p)->parent, sizeof(void*));
   EXPECT_TRUE(pool.GetSize(p) == 0 && !pool.Contains(p) && !pool.Free(p));
+
+  // A new bucket, before a Group links it.
+  const ArenaHeap::Use use;
+  Bucket* const b = Bucket::Create(Bucket::FromData(p)->parent, 50, 12);
+  EXPECT_EQ(b->parent, Bucket::FromData(p)->parent);
+  EXPECT_TRUE(!b->next1 && !b->prev1 && !b->next2 && !b->prev2);
+  Bucket::Destroy(b);
 }
 
 // A heap's size field before a block can read as a used record's header, and its bucket's as that

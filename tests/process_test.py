@@ -179,7 +179,7 @@ def run(calls):
         else:
             command = COMMANDS.get(program, f"exec {LAUNCHER} ../{program} {{}}").format(f'"{operations}"')
             script += f"(export LC_ALL=C {' '.join(keys)}; {command}) >{i}.out 2>{i}.err\necho $? >{i}.status\n"
-    folder = PROGRAMS / "process_calls"
+    folder = PROGRAMS / ("observer_calls" if OBSERVERS else "process_calls")
     shutil.rmtree(folder, ignore_errors=True)
     folder.mkdir()
     (folder / "calls.bat").write_text(script)
