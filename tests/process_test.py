@@ -54,10 +54,7 @@ TRACE=1 ZOR_STATIC_POOLS=1 : pool a; set max=3; pool b | names
     3 pools: __VOK_MEMPOOL_00001 a client; zvpt:d:@2; zvpt:d:@1; status 1
 ON=* TRACE=1 : pool a; alloc 1073741824 | cut -> zvpt:c:@1; ERROR 2: limit 1073741824; status 7
 
-# A client's static pools, in the program and in a library; the pools that the unloading leaves.
-ON=1 TRACE=1 ZOR_STATIC_POOLS=1 : say main; nameless; names; drop; say end
-    -> zvpt:c:@1; zvpt:c:@2; main; zvpt:c:@3;
-    3 pools: __VOK_MEMPOOL_00001 __VOK_MEMPOOL_00002 client; zvpt:d:@3; end; zvpt:d:@2; zvpt:d:@1
+# A library's static pools, and the pools that its unloading leaves.
 pool_host ON=1 TRACE=1 ZOR_STATIC_POOLS=1 : open client; pool a; close; open client; pool b; names
     -> zvpt:c:@1; zvpt:c:@2; zvpt:c:@3; zvpt:d:@2; zvpt:d:@1; zvpt:c:@4; zvpt:c:@5; zvpt:c:@6;
     3 pools: __VOK_MEMPOOL_00001 b client; zvpt:d:@5; zvpt:d:@4
