@@ -70,6 +70,8 @@ pool_host MIN_RECORD_SIZE=1000 ON=1 TRACE=1 : grouping; open library; open clien
     alloc 10 -> EXCEPTION 1: (1000>=1000); zvpt:c:@1; zvpt:a:@1:@2:10; !EXCEPTION 1: (1000>=1000)
 ZOR_SHOW_KEYS=1 ON=0 : -> ON; ZOR_MEMPOOL_ON; TRACE; BUCKET_SIZE; MAX_RECORD_SIZE;
     MIN_RECORD_SIZE; DATA_ALIGNMENT; KEEP_EMPTY_BUCKETS; INFO
+ZOR_SHOW_KEYS=1 ON=1 : -> ON; TRACE; BUCKET_SIZE; MAX_RECORD_SIZE; MIN_RECORD_SIZE; DATA_ALIGNMENT;
+    KEEP_EMPTY_BUCKETS; INFO
 """
 
 # A program's handlers run ahead of any library's, and a load throws nothing to its caller.
