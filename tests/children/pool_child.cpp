@@ -97,6 +97,7 @@ constexpr struct {
     {"set", [](State& s) { Set(s.operand); }},
     {"pool", [](State& s) { s.pools.push_back(new Mgr(s.operand.c_str())); }},
     {"nameless", [](State& s) { s.pools.push_back(new Mgr); }},
+    {"turn", [](State& s) { std::reverse(s.pools.begin(), s.pools.end()); }},
     {"drop", [](State& s) { delete &s.Pool(), s.pools.pop_back(); }},
     {"clear", [](State& s) { s.Pool().Clear(); }},
     {"report", [](State& s) { s.Pool().DbgDetailed(); }},
@@ -123,7 +124,7 @@ void Run(const std::string& script) {
     std::istringstream words(part);
     std::string name;
     ownState.operand.clear();
-    words >> name >> ownState.operand;
+    std::getline(words >> name >> std::ws, ownState.operand, '\0');
     try {
       if (!Act(name, ownState) && actOfClient != nullptr) actOfClient(name, ownState);
     } catch (const char* text) {

@@ -1,7 +1,7 @@
 #!/usr/bin/env python3
 """Draws reports of pools at random work, and compares in a browser what the page says with them.
 
-usage: picture_test.py VOKMEMPOOL RANDOM_POOLS CHROMIUM
+usage: picture_test.py VOKMEMPOOL POOL_CHILD CHROMIUM
 """
 import random
 import re

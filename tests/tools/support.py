@@ -5,6 +5,7 @@ import random
 import re
 import subprocess
 import sys
+from itertools import count
 
 PROGRAM, POOLS = sys.argv[1:3]
 
@@ -28,6 +29,37 @@ def tool(*arguments, given="", keys=None):
     return output
 
 
+def random_calls(draw, steps, clears, names, settings):
+    """Calls of the child program on two pools, which it prints in detail behind each half of the
+    steps. The first pool also gets back a block of the other one, and blocks for the second time."""
+    largest, blocks = settings["MAX_RECORD_SIZE"], count(1)
+    calls = [f"pool {name}" for name in names] + ["alloc 1"]
+    pools = [(name, []) for name in names]
+    for step in range(1, steps + 1):
+        if draw.random() < .5:
+            pools.reverse()
+            calls.append("turn")
+        name, held = pools[-1]
+        if not held or draw.random() < .6:
+            end = 2 * largest if draw.random() < .1 else largest // 3 + 1
+            calls.append(f"alloc {draw.randrange(1, end)}")
+            held.append(next(blocks))
+        else:
+            calls.append(f"free {held.pop(draw.randrange(len(held)))}")
+        if settings["ON"] and name == names[0]:  # the heap takes no misuse
+            if draw.random() < .05:
+                calls.append("free 0")
+            if settings["KEEP_EMPTY_BUCKETS"] and draw.random() < .05:  # its bucket stands
+                calls += ["alloc 1"] + [f"free {next(blocks)}"] * 2
+            if draw.randrange(steps) < clears:  # proved where both requests get one address
+                calls += ["alloc 1", "clear", "alloc 1"]
+                held[:] = [next(blocks), next(blocks)][1:]
+        if step in (steps // 2, steps):
+            both = ["report", "turn", "report", "turn"]  # in the order of their names
+            calls += both if name == min(names) else both[1:] + both[:1]
+    return calls + ["drop", "drop"]
+
+
 class Work:
     """Two pools at random work under random settings: the program's output, and in it the trace
     lines and reports in detail of one moment at half time and one at the end."""
@@ -36,16 +68,17 @@ class Work:
         draw = random.Random(seed)
         alignment, smallest = draw.choice((1, 2, 3, 4, 4, 4, 8, 16)), draw.randrange(4, 44)
         largest = smallest + 2 * alignment + draw.randrange(200)
-        self.keys = {"ZOR_VOK_MEMPOOL_" + key: str(value) for key, value in {
+        settings = {
             "ON": 1 - off, "DATA_ALIGNMENT": alignment, "MIN_RECORD_SIZE": smallest,
             "MAX_RECORD_SIZE": largest, "BUCKET_SIZE": largest + 4 + draw.randrange(1500),
-            "KEEP_EMPTY_BUCKETS": draw.randrange(2)}.items()}
-        self.output, errors, status = run("setarch", "-R", POOLS, seed, steps, clears, *names,
-                                          keys={**self.keys, "ZOR_VOK_MEMPOOL_TRACE": "1"})
+            "KEEP_EMPTY_BUCKETS": draw.randrange(2), "TRACE": 1}
+        self.keys = {f"ZOR_VOK_MEMPOOL_{key}": str(value) for key, value in settings.items()}
+        calls = ";".join(random_calls(draw, steps, clears, names, settings))
+        self.output, errors, status = run("setarch", "-R", POOLS, calls, keys=self.keys)
         same((errors, status), ("", 0), f"the pools of seed {seed}")
         titles = [found.start() for found in re.finditer("^MemPool::Mgr ", self.output, re.M)]
         self.ends = titles[0], titles[2]
-        self.reports = [re.sub("^zvpt:.*\n", "", text, flags=re.M) for text in
+        self.reports = [re.sub("^(zvpt:.*|freed|refused)\n", "", text, flags=re.M) for text in
                         (self.output[:titles[2]], self.output[titles[2]:])]
 
 

@@ -2,7 +2,7 @@
 """vokmempool as its users start it: commands, damaged reports and documents, what the library
 writes, and random trace lines against a literal count.
 
-usage: tools_test.py VOKMEMPOOL RANDOM_POOLS GOLDEN
+usage: tools_test.py VOKMEMPOOL POOL_CHILD GOLDEN
 
 VOK_MEMPOOL_APPROVE in the environment writes the golden text of the messages anew.
 """
@@ -14,6 +14,7 @@ import shlex
 import sys
 import tempfile
 from collections import Counter
+from fnmatch import fnmatchcase
 from pathlib import Path
 
 from support import PROGRAM, Work, data_of, run, same, tool
@@ -21,10 +22,7 @@ from support import PROGRAM, Work, data_of, run, same, tool
 GOLDEN = Path(sys.argv[3]).resolve()
 REPORTS = {path.stem: path.read_text() for path in (GOLDEN / "report").iterdir()}
 DEMO, DETAILED = REPORTS["demo-64"], REPORTS["detailed-64"]
-def golden(name):
-    return (GOLDEN / f"tools/{name}.txt").read_text()
-
-
+TOOLS = {path.stem: path.read_text() for path in (GOLDEN / "tools").iterdir()}
 USAGE = "\nusage: vokmempool SUBCOMMAND [OPTIONS] [FILE]\n"
 PLAIN = "-: line 1: a plain report, which has no records to draw"
 TRACE = """zvpt:c:a0
@@ -38,8 +36,7 @@ zvpt:f:c0:1000:
 zvpt:f:a0:1000:
 zvpt:c:\tx
 zvpt:a:a0:3000:9"""
-# Arguments, input, status, output, and what the error stream says behind the program's name. A star
-# stands for any text.
+# Arguments, input, status, output, and what the error stream says behind the program's name.
 COMMANDS = [
     ("", "", 2, "", "A subcommand is required" + USAGE),
     ("--help", "", 0, "*SUBCOMMAND --help*", ""),
@@ -49,12 +46,14 @@ COMMANDS = [
     ("report /no/such", "", 1, "", "/no/such: can't be opened: No such file or directory\n"),
     ("report /", "", 1, "", "/: can't be read: Is a directory\n"),
     ("report", "", 1, "", "-: there is no report in it\n"),
+    ("report", "MemPool::Mgr a\n" + 60 * "x", 1, "",
+     "-: line 2: expected \"   Version     : \"*, found \"" + 60 * "x" + "\"\n"),
     ("report --from-json", "{", 1, "", "-: not a document of reports: *"),
     ("report --check -", DEMO, 0, "", ""),
     ("report", DEMO.replace(" demo", " de\tmo") + DETAILED, 0, """\
 pool           used       free        ext    bytes held       payload    share
 de\\x09mo        508        280          2         19692          9860   50.1 %
-detailed         12         11          3      12349412      12348832  100.0 %
+detailed         25         27          3      12349968      12349032  100.0 %
 """, ""),
     ("report --check", DEMO.replace("  508\n", "  509\n"), 1,
      "line 10: Used Recs is 509, not 508: the sum of Used in BUCKETS\n", "-: 1 breach\n"),
@@ -70,8 +69,11 @@ detailed         12         11          3      12349412      12348832  100.0 %
     ("trace --bucket-size 9", "", 2, "", "--bucket-size requires --at" + USAGE),
     ("trace --at 0", "", 2, "", "--at: Value 0 not in range*"),
     ("trace --name cache", "", 2, "", "--name: takes POOL=NAME, *"),
-    ("trace --name a0=cache --massif massif", TRACE, 0, golden("trace"), ""),
-    ("trace --json --name a0=cache", TRACE, 0, golden("trace-json"), ""),
+    ("trace --name a0=cache --massif massif", TRACE, 0, TOOLS["trace"], ""),
+    ("trace --json --name a0=cache", TRACE, 0, TOOLS["trace-json"], ""),
+    # Another record may have the replay's block of one that was cleared.
+    ("trace --at 5", "zvpt:a:a0:1:24\nzvpt:a:a0:2:24\nzvpt:a:a0:1:24\nzvpt:a:a0:3:24\n"
+     "zvpt:f:a0:2:\n", 0, "*Used Recs   :        2\n*", "*"),
     ("trace --at 8 --off", TRACE, 0, "*Enabled     :        0\n*", "*"),
     ("trace --at 11 --name a0=cache --name=c0=\x01 --bucket-size 162 --max-record-size 60 "
      "--min-record-size 9 --data-alignment 2 --keep-empty-buckets", TRACE, 0,
@@ -96,13 +98,8 @@ SHELL = [
 
 
 def is_like(text, form):
-    """Whether the pieces of a form stand in a text one behind the other, with no rest."""
-    first, *pieces = form.split("*")
-    end = len(first) if text.startswith(first) else -1
-    for piece in pieces:
-        found = text.find(piece, end) if end >= 0 else -1
-        end = found + len(piece) if found >= 0 else -1
-    return end == len(text) or end >= 0 and form.endswith("*")
+    """A star stands for any text, and nothing else of a form is special."""
+    return fnmatchcase(text, re.sub(r"([\[?])", r"[\1]", form))
 
 
 def test_commands():
@@ -112,7 +109,7 @@ def test_commands():
         same((is_like(found[0], output), is_like(found[1], errors), found[2]),
              (True, True, status), f"{arguments}: {found}")
     same(sorted(os.listdir()), ["massif", "page.html"], "the written files")
-    same(Path("massif").read_text(), golden("massif"), "the samples")
+    same(Path("massif").read_text(), TOOLS["massif"], "the samples")
     for command, output, errors in SHELL:
         found = run("bash", "-c", command.replace("vokmempool", PROGRAM), given=DEMO * 400)
         same((is_like(found[0], output), is_like(found[1], errors)), (True, True),
@@ -122,18 +119,13 @@ def test_commands():
 # What other states of a stream make of a report, what damage of a pool does, and what cuts
 # leave: a text, what stands there instead, and the message.
 NUMBER = "expected a decimal number up to 4294967295 at the right of 8 columns in column 18, "
+NUMBERS = ("        e", " 88      ", " ******88", "      088", "        88", " 4294967296")
 CHANGES = [
-    (" :       14\n", " :        e\n", "line 6: " + NUMBER),
-    (" :       88\n", " : 88      \n", "line 4: " + NUMBER),
-    (" :       88\n", " : ******88\n", "line 4: " + NUMBER),
-    (" :       88\n", " :      088\n", "line 4: " + NUMBER),
-    (" :       88\n", " :        88\n", "line 4: " + NUMBER),
-    (" :       88\n", " : 4294967296\n", "line 4: " + NUMBER),
-    ("Enabled     :        1\n", "Enabled     :     true\n", "line 15: " + NUMBER),
-    (" 25.000%", "25.0000%", "line 40: expected a number with three decimals at the right of 7"),
-    (" 25.000%", "  25.00%", "line 40: expected a number with three decimals at the right of 7"),
-    ("+---------+\n", "+\n", "line 103: expected a rule over 8 boxes"),
-    ("| FREE    | \n", "| FREE    | FREE    | \n", "line 104: expected the end of the line"),
+    *((" :       88\n", f" :{number}\n", f"line 4: {NUMBER}") for number in NUMBERS),
+    (" 12.500%", "12.5000%", "line 40: expected a number with three decimals at the right of 7"),
+    (" 12.500%", "  12.50%", "line 40: expected a number with three decimals at the right of 7"),
+    ("+---------+\n", "+\n", "line 114: expected a rule over 8 boxes"),
+    ("| FREE    | \n", "| FREE    | FREE    | \n", "line 115: expected the end of the line"),
     ("#002\n", "#02\n", "expected a number filled with zeros to 3 columns in column 21"),
     ("#002\n", "#0002\n", "expected a number filled with zeros to 3 columns in column 21"),
     ("Next1       :        0", "Next1       :      0x0", "expected an address at the right of 8"),
@@ -141,10 +133,10 @@ CHANGES = [
     ("MemPool::Mgr", "MemPool::Mgr x\nMemPool::Mgr", "line 2: expected \"   Version     : \","),
     ("Enabled     :        1\n", "Enabled     :        0\n", "line 15: Enabled is 0, and the pool"),
     ("***\n", "***+\n", "line 30: the bar has a \"+\"\n"),
-    ("228 \n\n", "228 \nWARNING:../s/MemPool:  110: Number of recs 7 < 8\n\n",
-     "line 95: the library warns of what it found"),
+    ("2e8 \n\n", "2e8 \nWARNING:../s/MemPool:  110: Number of recs 7 < 8\n\n",
+     "line 106: the library warns of what it found"),
     (" 0 \n\n\n   MemPool::Bucket #002", " 0 \nWARNING:../s/MemPool:12345: Too many free recs "
-     "7 > 6\n\n\n   MemPool::Bucket #002", "line 119: the library warns of what it found"),
+     "7 > 6\n\n\n   MemPool::Bucket #002", "line 143: the library warns of what it found"),
 ]
 
 
@@ -202,7 +194,7 @@ def test_changes():
                    for form in sorted({form for form, _ in messages}))
     if "VOK_MEMPOOL_APPROVE" in os.environ:
         (GOLDEN / "tools/messages.txt").write_text(text)
-    same(text, golden("messages"), "the messages")
+    same(text, TOOLS["messages"], "the messages")
 
 
 NAMES = ("", "two\nlines", "caf\xe9", "\xe2\x82\xac", '"\\\t', "MemPool", "cache")
@@ -243,16 +235,12 @@ def test_library():
             again = tool("trace", "--detailed", "--at", trace.count("\n"), *named,
                          given=work.output, keys=work.keys)
             same(numbered(again), numbered(second), f"seed {seed}")
-        used = {int(row["data"], 16): row["length"]
-                for pool in data for row in pool["extRecs"]["rows"]}
-        used.update({int(row["addr"], 16) + 4: row["dataSize"]
-                     for pool in data for bucket in pool["bucketReports"]
-                     for row in bucket["records"]["rows"] if row["type"] == "USED"})
+        used = {int(row["data"], 16) for pool in data for row in pool["extRecs"]["rows"]}
+        used.update(int(row["addr"], 16) + 4 for pool in data for bucket in pool["bucketReports"]
+                    for row in bucket["records"]["rows"] if row["type"] == "USED")
         live = json.loads(tool("trace", "--json", given=trace))["live"]
-        certain = {int(row["data"], 16): row["size"] for row in live if not row["uncertain"]}
-        same(certain.keys() <= used.keys() and (clears or certain.keys() == used.keys()), True,
-             f"the live records of seed {seed}")
-        same([data for data in certain if certain[data] > used[data]], [], "sizes")
+        certain = {int(row["data"], 16) for row in live if not row["uncertain"]}
+        same(certain - used, set(), f"the live records of seed {seed}")
 
 
 EVENTS = ("zvpt:c:5581c0de", "zvpt:d:003a1f40\r", "zvpt:a:1:ffffffffffffffff:1073741823",
