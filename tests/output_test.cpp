@@ -104,7 +104,7 @@ TEST(Threads, SwitchTraceAndItsLinesTogether) {
   std::barrier<> both(2);
   int numApart = 0;
   const auto work = [&](bool on) {
-    for (int i = 0; i < 20000; ++i) {
+    for (int i = 0; i < 5000; ++i) {
       both.arrive_and_wait();
       ZOR_VOK_MEMPOOL_TRACE(on);
       both.arrive_and_wait();
