@@ -15,6 +15,10 @@
 #include <gtest/gtest.h>
 #include <memory>
 
+#ifdef __linux__
+#include <sys/mman.h>
+#endif
+
 using namespace VOK::MemPool;
 
 namespace {
@@ -77,6 +81,24 @@ TEST_F(Pools, DamagedHeaders) {
   Bucket scrubbed{};
   Bucket::Destroy(&scrubbed);
 }
+
+#ifdef __linux__
+// A header in low memory that leads to a bucket at address 0.
+TEST_F(Pools, BucketAtNull) {
+  auto* const page = static_cast<std::uint8_t*>(
+      mmap(reinterpret_cast<void*>(0x10000), 4096, PROT_READ | PROT_WRITE,
+           MAP_PRIVATE | MAP_ANONYMOUS | MAP_FIXED_NOREPLACE, -1, 0));
+  if (reinterpret_cast<std::uintptr_t>(page) != 0x10000) return; // not every system maps it
+  std::uint8_t* const p = page + 8;
+  const std::size_t offset = 0x10008 - sizeof(Rec) - recsBaseOffset;
+  p[-4] = static_cast<std::uint8_t>(offset % 256);
+  p[-3] = static_cast<std::uint8_t>(offset / 256);
+  p[-2] = RecType::Used;
+  Mgr& pool = Make("");
+  EXPECT_TRUE(pool.GetSize(p) == 0 && !pool.Contains(p) && !pool.Free(p));
+  munmap(page, 4096);
+}
+#endif
 
 // What a pool's own call never asks: a lookup by the Group itself, and another Group's bucket.
 TEST_F(Pools, GroupFree) {

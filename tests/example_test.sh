@@ -3,20 +3,11 @@
 # text, or writes that anew if VOK_MEMPOOL_APPROVE is set. An address becomes a number, the same at
 # each place, and the sizes that go with the width of a pointer become an N.
 set -uo pipefail
-name=$(basename "${@: -1}" .exe)
-golden=$(dirname "$0")/golden/examples/$name.txt
+golden=$(dirname "$0")/golden/examples/$(basename "${@: -1}" .exe).txt
 
 masked() {
-  tr -d '\r' |
-    sed -E -e '/^zvpt:/s/:([0-9a-f]{5,})/:0x\1/g' -e 's/^( +Sizeof (Buck|    ) +: +)[0-9]+$/\1N/' |
-    awk '{
-      for (rest = $0; match(rest, /0x[0-9a-f]+/); rest = substr(rest, RSTART + RLENGTH)) {
-        address = substr(rest, RSTART, RLENGTH)
-        if (!(address in number)) number[address] = "A" ++count
-        printf "%s%s", substr(rest, 1, RSTART - 1), number[address]
-      }
-      print rest
-    }'
+  perl -pe 's/\r//; s/:([0-9a-f]{5,})/:0x$1/g if /^zvpt:/; s/0x[0-9a-f]+/$a{$&} ||= "A" . ++$n/ge;
+    s/^( +Sizeof (Buck|    ) +: +)\d+$/$1N/'
 }
 
 if [ -n "${VOK_MEMPOOL_APPROVE-}" ]; then

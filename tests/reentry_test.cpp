@@ -32,7 +32,8 @@ struct Reentered {
     if (p != nullptr) return held.push_back(p);
     if (step == clear) mgr.Clear();
     for (void* const h : held)
-      EXPECT_TRUE(step == clear || (mgr.Contains(h) && mgr.GetSize(h) >= 4 && mgr.Free(h)));
+      EXPECT_TRUE(step == clear || (mgr.Contains(h) && mgr.GetSize(h) >= 4 &&
+                                    *static_cast<std::uint8_t*>(h) == 0xA5 && mgr.Free(h)));
     held.clear();
   }
 };

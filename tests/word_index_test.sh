@@ -26,6 +26,5 @@ done <<'END'
 1 no-such-text.txt
 1 --drop third.txt first.txt
 2 --repeat 0 first.txt
-2 --repeat junk first.txt
 2 --no-such-option
 END

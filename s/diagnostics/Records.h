@@ -41,19 +41,6 @@ inline const char* TypeLabel(std::uint8_t type) {
   }
 }
 
-/// Calls `visit` with the offset of each record in address order, that of a piece at the end of a
-/// damaged area too. The first record is visited before any look at the end; a header whose sizes
-/// lead to no record at all gives none.
-template <class Visit>
-void ForEachRecord(const Bucket& bucket, Visit visit) {
-  if (bucket.recSize == 0 || bucket.recsSize < 2) return;
-  std::uint32_t offset = 2;
-  do {
-    visit(offset);
-    offset += bucket.recSize;
-  } while (offset < bucket.recsSize);
-}
-
 } // namespace VOK::MemPool
 
 #endif

@@ -132,6 +132,19 @@ static_assert(offsetof(Bucket, freeHead) == 5 * sizeof(void*) + 2 * sizeof(std::
 static_assert(offsetof(Bucket, freeRecs) == 5 * sizeof(void*) + 3 * sizeof(std::uint16_t));
 static_assert(sizeof(Bucket) == 5 * sizeof(void*) + 4 * sizeof(std::uint16_t), "packed");
 
+/// Calls `visit` with the offset of each record in address order, that of a piece at the end of a
+/// damaged area too. The first record is visited before any look at the end; a header whose sizes
+/// lead to no record at all gives none.
+template <class Visit>
+void ForEachRecord(const Bucket& bucket, Visit visit) {
+  if (bucket.recSize == 0 || bucket.recsSize < 2) return;
+  std::uint32_t offset = 2;
+  do {
+    visit(offset);
+    offset += bucket.recSize;
+  } while (offset < bucket.recsSize);
+}
+
 // In numbers, since the compiler may take it for granted that no sum of a pointer is null.
 VOK_HOT Bucket* Bucket::OfUsed(const Rec* rec) {
   return reinterpret_cast<Bucket*>(reinterpret_cast<std::uintptr_t>(rec) - rec->Offset() -

@@ -79,6 +79,11 @@ VOK_COLD bool BucketMgr::FreeSlow(void* p) {
   return true;
 }
 
+VOK_COLD bool BucketMgr::FreeLow(void* p) {
+  if (p == nullptr) return false;
+  return Observers::Watching() ? FreeInstrumented(p) : FreeSlow(p);
+}
+
 Bucket* BucketMgr::FindBucket(const void* p) const {
   if (!enabled) return nullptr;
   Bucket* const bucket = Bucket::FromData(p);
@@ -126,8 +131,7 @@ bool BucketMgr::Contains(const void* p) const {
 
 void BucketMgr::Clear() noexcept {
   const Observers::Quiet quiet;
-  if (Observers::Present()) [[unlikely]]
-    ReportAllGone();
+  ReportAllGone();
   for (ExtRec* e = extRecs; e != nullptr;) {
     ExtRec* const next = e->next;
     ExtRec::Destroy(e);
@@ -135,12 +139,11 @@ void BucketMgr::Clear() noexcept {
   }
   extRecs = nullptr;
   numExtRecs = 0;
-  for (std::uint32_t i = 0; i < numGroups; ++i) {
-    if (groups[i] == nullptr) continue;
-    groups[i]->Clear();
-    delete groups[i];
+  ForEachGroup(*this, [this](Group& group, std::uint32_t i) {
+    group.Clear();
+    delete &group;
     groups[i] = nullptr;
-  }
+  });
 }
 
 std::uint32_t BucketMgr::GetNumBuckets() const {

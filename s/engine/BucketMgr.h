@@ -102,6 +102,7 @@ private:
   void* AllocSlow(std::uint32_t size);
   void* AllocExtRec(std::uint32_t size);
   bool FreeSlow(void* p);
+  bool FreeLow(void* p);
 
   void* AllocInstrumented(std::uint32_t size);
   void* AllocReported(std::uint32_t size);

@@ -16,8 +16,9 @@ namespace {
 
 void ReportMade(Bucket* b) {
   Observers::BlockMade(b, recsBaseOffset + b->recsSize);
-  for (std::uint32_t offset = 2; offset < b->recsSize; offset += b->recSize)
+  ForEachRecord(*b, [b](std::uint32_t offset) {
     Observers::Vacant(b->RecAt(offset)->Data(), b->recSize - recHeaderSize);
+  });
 }
 
 void ReportGone(Bucket* b) { Observers::BlockGone(b, recsBaseOffset + b->recsSize); }
@@ -44,20 +45,23 @@ VOK_COLD bool BucketMgr::FreeInstrumented(void* p) {
   return enabled && Observers::Present() ? FreeReported(p) : FreeSlow(p);
 }
 
-// A record comes from a new bucket exactly where its Group has no free one.
+// A record comes from a new bucket exactly where its Group has no free one. The Group is made
+// before that is asked: a new-handler that runs meanwhile may give it a bucket.
 void* BucketMgr::AllocReported(std::uint32_t size) {
   const Observers::Quiet quiet;
-  const Group* const group = FindGroup(size);
-  const bool makesBucket = group == nullptr || group->head2 == nullptr;
-  void* const p = AllocSlow(size);
-  if (Bucket* const bucket = FindBucket(p)) {
-    if (makesBucket) ReportMade(bucket);
-    Observers::RecordMade(bucket, p, size, bucket->recSize - recHeaderSize);
-  } else {
+  const std::uint32_t dataSize = RoundUp(size, dataAlignment);
+  if (dataSize + recHeaderSize > maxRecSize) {
+    void* const p = AllocExtRec(size);
     auto* const e = static_cast<ExtRec*>(p) - 1;
     Observers::BlockMade(e, sizeof(ExtRec) + size);
     Observers::RecordMade(e, p, size, size);
+    return p;
   }
+  const bool makesBucket = GroupFor(dataSize)->head2 == nullptr;
+  void* const p = AllocSlow(size);
+  Bucket* const bucket = FindBucket(p);
+  if (makesBucket) ReportMade(bucket);
+  Observers::RecordMade(bucket, p, size, bucket->recSize - recHeaderSize);
   return p;
 }
 
@@ -73,14 +77,16 @@ bool BucketMgr::FreeReported(void* p) {
   return FreeSlow(p);
 }
 
-VOK_COLD void BucketMgr::ReportAllGone() const {
+void BucketMgr::ReportAllGone() const {
+  if (!Observers::Present()) return;
   for (ExtRec* e = extRecs; e != nullptr; e = e->next)
     ReportGone(e);
   ForEachGroup(*this, [](const Group& group, std::uint32_t) {
     for (Bucket* b = group.head1; b != nullptr; b = b->next1) {
-      for (std::uint32_t offset = 2; offset < b->recsSize; offset += b->recSize)
+      ForEachRecord(*b, [b](std::uint32_t offset) {
         if (Rec* const rec = b->RecAt(offset); rec->type == RecType::Used)
           ReportRecordGone(b, rec->Data());
+      });
       ReportGone(b);
     }
   });

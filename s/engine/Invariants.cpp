@@ -32,13 +32,14 @@ bool FreeListIsValid(const Bucket& bucket) {
 
 bool UsedRecsAreValid(const Bucket& bucket) {
   std::uint32_t used = 0;
-  for (std::uint32_t offset = 2; offset < bucket.recsSize; offset += bucket.recSize) {
+  bool areUsed = true;
+  ForEachRecord(bucket, [&](std::uint32_t offset) {
     const Rec* const rec = bucket.RecAt(offset);
-    if (rec->type == RecType::Free) continue;
-    if (rec->type != RecType::Used || rec->Offset() != offset) return false;
+    if (rec->type == RecType::Free) return;
+    areUsed = areUsed && rec->type == RecType::Used && rec->Offset() == offset;
     ++used;
-  }
-  return used == bucket.TotalRecs() - bucket.freeRecs;
+  });
+  return areUsed && used == bucket.TotalRecs() - bucket.freeRecs;
 }
 
 bool ExtRecsAreValid(const BucketMgr& pool) {

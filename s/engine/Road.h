@@ -11,6 +11,7 @@
 #include "services/Observers.h"
 
 #include <cassert>
+#include <cstdint>
 
 namespace VOK::MemPool {
 
@@ -32,11 +33,15 @@ VOK_HOT void* BucketMgr::Alloc(std::uint32_t size) {
   return group->Alloc();
 }
 
+/// Up to here a header can lead to a bucket at address 0; from here on it can't.
+inline constexpr std::uintptr_t lowAddresses = maxBucketSize + recsBaseOffset + sizeof(Rec);
+
 // The Group that the pool has for the bucket's record size is the bucket's parent if the bucket is
 // this pool's. Where a released bucket was, that pointer can be anything: it is compared and never
 // followed.
 VOK_HOT bool BucketMgr::Free(void* p) {
-  if (p == nullptr) return false;
+  if (reinterpret_cast<std::uintptr_t>(p) <= lowAddresses) [[unlikely]]
+    return FreeLow(p);
   if (Observers::Watching()) [[unlikely]]
     return FreeInstrumented(p);
   if (!enabled) [[unlikely]]

@@ -24,7 +24,8 @@ inline constexpr std::uint8_t watchingChecker = 2;
 inline bool Present() { return present; }
 VOK_HOT bool Watching() { return watching != 0; }
 
-/// The trace switch, which any thread may read and set at any time.
+/// The trace switch, which any thread may read and set at any time. A request that runs at the same
+/// time reads the byte without synchronisation and takes either value.
 bool IsTracing();
 void SetTracing(bool on);
 
@@ -53,7 +54,7 @@ void RecordGone(const void* block, void* p, std::size_t capacity);
 /// headers, which are marked as nobody's. It lives for no call on the heap of a disabled pool.
 class Quiet {
 public:
-  explicit Quiet(bool wanted = true) : quiet(wanted && present) {
+  Quiet() : quiet(Present()) {
     if (quiet) [[unlikely]]
       Judge(false);
   }

@@ -19,8 +19,9 @@ namespace VOK::MemPool {
 /// its pending width. A line that can't be written is lost and nothing is thrown, also where the
 /// program asked the stream to throw: the operation that reports itself goes on.
 ///
-/// Nothing comes from the heap. So the digits of a number are grouped here: std::num_put allocates
-/// a copy of each locale's format that it meets.
+/// Nothing comes from the heap, for a locale with up to 15 group sizes. So the digits of a number
+/// are grouped here: std::num_put allocates a copy of each locale's format that it meets. A num_put
+/// of the program's own isn't asked.
 class OutputLine {
 public:
   /// A stream that is tied to `stream` is flushed first.

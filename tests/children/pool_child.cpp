@@ -1,6 +1,8 @@
 // What process_test starts: a program that does what its argument says, operations with ";" between
 // them and, after a "|", those at its exit. It is built three times: with the library, as a client
 // library, and as a host, which is linked with neither and loads them.
+#include "support/Process.h"
+
 #include <MemPool>
 
 #include <algorithm>
@@ -8,18 +10,14 @@
 #include <cstdlib>
 #include <cstring>
 #include <iostream>
-#include <locale>
 #include <memory>
 #include <new>
-#include <sstream>
-#include <string>
 #include <vector>
 
 #ifdef _WIN32
 #include <windows.h>
 #else
 #include <dlfcn.h>
-#include <sys/auxv.h>
 #endif
 
 using namespace VOK::MemPool;
@@ -63,16 +61,6 @@ void Open(State& s) {
   actOfClient = reinterpret_cast<decltype(actOfClient)>(dlsym(handle, "Act"));
 }
 
-// A locale that groups the digits of every number by one.
-void UseGroupingLocale(State&) {
-  struct Grouping : std::numpunct<char> {
-    char do_thousands_sep() const override { return '_'; }
-    std::string do_grouping() const override { return "\1"; }
-  };
-  std::locale::global(std::locale(std::locale::classic(), new Grouping));
-  std::cerr.imbue(std::locale());
-}
-
 #ifndef VOK_MEMPOOL_HOST
 const bool wanted = std::getenv("ZOR_STATIC_POOLS") != nullptr;
 const std::unique_ptr<Mgr> named(wanted ? new Mgr("client") : nullptr);
@@ -83,15 +71,13 @@ void Alloc(State& s) {
   std::memset(s.blocks.back(), 1, std::min(s.Number(), 1U << 16));
 }
 
-void Free(State& s) { std::cout << (s.Pool().Free(s.Block()) ? "freed\n" : "refused\n"); }
-
 // The compiler must not drop a write that nobody reads.
 void Write(State& s) { static_cast<volatile char*>(s.blocks.back())[std::stol(s.operand)] = 2; }
 
 void ShowNames(State&) {
   std::vector<Mgr*> mgrs;
   GetMgrs(mgrs);
-  std::cout << std::to_string(GetNumMgrs()) << " pools:";
+  std::cout << GetNumMgrs() << " pools:";
   for (const Mgr* mgr : mgrs)
     std::cout << ' ' << mgr->GetName();
   std::cout << std::endl;
@@ -103,17 +89,12 @@ constexpr struct {
   void (*act)(State& s);
 } operations[] = {
     {"say", [](State& s) { std::cout << s.operand << std::endl; }},
-    {"grouping", UseGroupingLocale},
+    {"grouping", [](State&) { std::locale::global(Grouping()), std::cerr.imbue(std::locale()); }},
     {"cut", [](State&) { std::_Exit(7); }}, // flushes no stream
     {"open", Open},
     {"close", [](State&) { dlclose(handle), actOfClient = nullptr; }},
-#ifndef _WIN32
-    {"raised", [](State&) { std::cout << getauxval(AT_SECURE) << std::endl; }},
-#endif
 #ifndef VOK_MEMPOOL_HOST
-    {"max", [](State& s) { ZOR_VOK_MEMPOOL_MAX_RECORD_SIZE(s.Number()); }},
-    {"min", [](State& s) { ZOR_VOK_MEMPOOL_MIN_RECORD_SIZE(s.Number()); }},
-    {"trace", [](State& s) { ZOR_VOK_MEMPOOL_TRACE(s.operand == "1"); }},
+    {"set", [](State& s) { Set(s.operand); }},
     {"pool", [](State& s) { s.pools.push_back(new Mgr(s.operand.c_str())); }},
     {"nameless", [](State& s) { s.pools.push_back(new Mgr); }},
     {"turn", [](State& s) { std::reverse(s.pools.begin(), s.pools.end()); }},
@@ -121,7 +102,7 @@ constexpr struct {
     {"clear", [](State& s) { s.Pool().Clear(); }},
     {"report", [](State& s) { s.Pool().DbgDetailed(); }},
     {"alloc", Alloc},
-    {"free", Free},
+    {"free", [](State& s) { std::cout << (s.Pool().Free(s.Block()) ? "freed\n" : "refused\n"); }},
     {"size", [](State& s) { std::cout << s.Pool().GetSize(s.Block()) << '\n'; }},
     {"contains", [](State& s) { std::cout << s.Pool().Contains(s.Block()) << '\n'; }},
     {"write", Write},
@@ -144,15 +125,13 @@ void Run(const std::string& script) {
     std::string name;
     ownState.operand.clear();
     std::getline(words >> name >> std::ws, ownState.operand, '\0');
-    const char* caught = nullptr;
     try {
       if (!Act(name, ownState) && actOfClient != nullptr) actOfClient(name, ownState);
     } catch (const char* text) {
-      caught = text;
+      OverwriteStack();
+      std::cout << text << std::endl;
     } catch (const std::bad_alloc&) { // of a request that no test relies on
     }
-    OverwriteStack();
-    if (caught != nullptr) std::cout << caught << std::endl;
   }
 }
 

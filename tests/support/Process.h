@@ -1,4 +1,4 @@
-// What a test changes of its process, restored at its end: the settings and the locale.
+// What a test changes of its process: the settings and the locale.
 #ifndef VOK_MEMPOOL_TESTS_PROCESS_H
 #define VOK_MEMPOOL_TESTS_PROCESS_H
 
@@ -30,17 +30,23 @@ struct KeepSettings {
   ~KeepSettings() { Set("bucket=4010 align=4 max=1000 min=8 keep=0 trace=0 on=0"); }
 };
 
-/// While it lives, the global locale groups digits.
-class GroupingLocale {
-public:
-  ~GroupingLocale() { std::locale::global(before); }
+inline bool dead = false; ///< locales and buffers of a test throw, as those of a program may
 
-private:
-  struct Grouping : std::numpunct<char> {
+/// A locale that groups digits by these sizes and that no number was formed in yet.
+inline std::locale Grouping(const char* sizes = "\1") {
+  struct Format : std::numpunct<char> {
+    explicit Format(const char* sizes_) : sizes(sizes_) {}
     char do_thousands_sep() const override { return '.'; }
-    std::string do_grouping() const override { return "\1"; }
+    std::string do_grouping() const override { return dead ? throw 1 : sizes; }
+    const char* const sizes;
   };
-  const std::locale before = std::locale::global(std::locale(std::locale::classic(), new Grouping));
+  return std::locale(std::locale::classic(), new Format(sizes));
+}
+
+/// While it lives, the global locale groups digits.
+struct GroupingLocale {
+  ~GroupingLocale() { std::locale::global(before); }
+  const std::locale before = std::locale::global(Grouping());
 };
 
 #endif
