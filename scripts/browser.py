@@ -100,7 +100,8 @@ class Browser:
 
     def settle(self):
         """Waits for what is due in the next frame."""
-        self.evaluate("new Promise((done) => requestAnimationFrame(() => requestAnimationFrame(done)))")
+        self.evaluate("""new Promise((done) =>
+            requestAnimationFrame(() => requestAnimationFrame(done)))""")
 
     def screenshot(self, path):
         picture = self.call("Page.captureScreenshot", format="png")["data"]

@@ -31,7 +31,7 @@ def tool(*arguments, given="", keys=None):
 
 def random_calls(draw, steps, clears, names, settings):
     """Calls of the child program on two pools, which it prints in detail behind each half of the
-    steps. The first pool also gets back a block of the other one, and blocks for the second time."""
+    steps. The first one also gets a block of the other back, and some blocks twice."""
     largest, blocks = settings["MAX_RECORD_SIZE"], count(1)
     calls = [f"pool {name}" for name in names] + ["alloc 1"]
     pools = [(name, []) for name in names]

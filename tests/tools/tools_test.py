@@ -49,7 +49,8 @@ COMMANDS = [
     ("report", "MemPool::Mgr a\n" + 60 * "x", 1, "",
      "-: line 2: expected \"   Version     : \"*, found \"" + 60 * "x" + "\"\n"),
     ("report --from-json", "{", 1, "", "-: not a document of reports: *"),
-    ("report --from-json", '{"other": [{}], "reports": []}', 1, "", "-: there is no report in it\n"),
+    ("report --from-json", '{"other": [{}], "reports": []}', 1, "",
+     "-: there is no report in it\n"),
     ("report --check -", DEMO, 0, "", ""),
     ("report", DEMO.replace(" demo", " de\tmo") + DETAILED, 0, """\
 pool           used       free        ext    bytes held       payload    share
