@@ -135,7 +135,7 @@ CHANGES = [
     (" 12.500%", "  12.50%", "line 40: expected a number with three decimals at the right of 7"),
     ("+---------+\n", "+\n", "line 114: expected a rule over 8 boxes"),
     ("| FREE    | \n", "| FREE    | FREE    | \n", "line 115: expected the end of the line"),
-    ("#002\n", "#02\n", "expected a number filled with zeros to 3 columns in column 21"),
+    ("#002\n", "#2\n", "expected a number filled with zeros to 3 columns in column 21"),
     ("#002\n", "#0002\n", "expected a number filled with zeros to 3 columns in column 21"),
     ("Next1       :        0", "Next1       :      0x0", "expected an address at the right of 8"),
     ("Exp $\n", "Exp $\r\n", "line 2: expected a line end of CR and LF in front of this"),
