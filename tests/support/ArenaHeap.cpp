@@ -124,7 +124,7 @@ void* ArenaHeap::Take(std::size_t size, Form form) {
     sameRoom.pop_back();
   }
   Open(p - guard, guard + RoomOf(size) + guard);
-  ForGuards(p, size, [](std::byte& byte, std::byte wanted) { byte = wanted; });
+  ForGuards(p, size, [](std::byte& guarded, std::byte wanted) { guarded = wanted; });
   std::memset(p, delivered, size);
   Close(p - guard, guard + RoomOf(size) + guard);
   Open(p, size);
@@ -162,7 +162,7 @@ void ArenaHeap::CheckGuards(std::byte* p, const Block& block) {
   const std::size_t whole = guard + RoomOf(block.size) + guard;
   bool isWhole = true;
   Open(p - guard, whole);
-  ForGuards(p, block.size, [&](std::byte byte, std::byte wanted) { isWhole &= byte == wanted; });
+  ForGuards(p, block.size, [&](std::byte found, std::byte wanted) { isWhole &= found == wanted; });
   Close(p - guard, whole);
   Open(p, block.size);
   if (!isWhole) Fault("written beyond its bounds", block.size);

@@ -164,7 +164,7 @@ public:
     std::uint8_t* const at = Around(p);
     if (at == nullptr) return 0;
     const auto& [group, free, next2] = buckets.at(at);
-    const std::uint32_t offset = Number(p - 4 - at - base);
+    const std::uint32_t offset = Number(p - 4 - at) - base;
     if (offset % group->recSize != 2 % group->recSize || std::ranges::count(free, offset) > 0)
       return 0;
     return group->recSize - 4;
@@ -244,7 +244,7 @@ private:
     Bucket& bucket = buckets[at];
     Group& group = *bucket.group;
     if (bucket.free.empty()) group.withFree.push_front(at);
-    bucket.free.push_back(Number(p - 4 - at - base));
+    bucket.free.push_back(Number(p - 4 - at) - base);
     if (bucket.free.size() < Total(group) || settings.keepEmptyBuckets) return;
     RefreshBucket(at);
     std::erase(group.all, at);
