@@ -125,6 +125,7 @@ void Run(const std::string& script) {
     std::string name;
     ownState.operand.clear();
     std::getline(words >> name >> std::ws, ownState.operand, '\0');
+    ownState.operand.erase(ownState.operand.find_last_not_of(' ') + 1);
     try {
       if (!Act(name, ownState) && actOfClient != nullptr) actOfClient(name, ownState);
     } catch (const char* text) {
