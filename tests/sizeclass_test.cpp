@@ -22,8 +22,8 @@ std::string Sweep(const Reference::Settings& given) {
       LargestAtIndex0(s.minRecSize, s.maxRecSize, s.dataAlignment) != capacity[0])
     return "index 0";
 
-  const IndexRule fast = MakeIndexRule(s.minRecSize, s.maxRecSize, s.dataAlignment);
-  const bool isFast = fast.shift != noIndexRule.shift;
+  const FastIndex fast = MakeFastIndex(s.minRecSize, s.maxRecSize, s.dataAlignment);
+  const bool isFast = fast.shift != noFastIndex.shift;
   for (std::uint32_t size = 0; size <= s.maxRecSize + 20; ++size) {
     const std::uint32_t data = s.Rounded(size);
     const std::uint32_t index = data + 4 <= s.maxRecSize ? s.Index(data) : none;
@@ -54,7 +54,7 @@ TEST(SizeClasses, EverySizeOfManyPools) {
             << "alignment " << alignment << ", minimum " << min << ", maximum " << max;
       }
   for (const std::uint32_t alignment : {1u, 2u, 4u, 8u, 16u, 64u})
-    EXPECT_NE(MakeIndexRule(RoundUp(8u, alignment), 1024, alignment).shift, noIndexRule.shift);
+    EXPECT_NE(MakeFastIndex(RoundUp(8u, alignment), 1024, alignment).shift, noFastIndex.shift);
 }
 
 } // namespace

@@ -5,9 +5,9 @@
 
 #include "engine/Bucket.h"
 #include "engine/ExtRec.h"
+#include "engine/FastPath.h"
 #include "engine/Group.h"
 #include "engine/KeepStores.h"
-#include "engine/Road.h"
 #include "services/Messages.h"
 #include "services/Observers.h"
 #include "services/Settings.h"
@@ -39,7 +39,7 @@ BucketMgr::BucketMgr(Mgr* mgr_, const std::string& name_)
   maxRecSize = static_cast<std::uint32_t>(range.max);
   minRecSize = static_cast<std::uint32_t>(range.min);
   numGroups = (maxRecSize - minRecSize) / dataAlignment + 1;
-  indexRule = MakeIndexRule(minRecSize, maxRecSize, dataAlignment);
+  fastIndex = MakeFastIndex(minRecSize, maxRecSize, dataAlignment);
   groups = new Group* [numGroups] {};
 }
 
@@ -79,7 +79,7 @@ VOK_COLD bool BucketMgr::FreeSlow(void* p) {
   return true;
 }
 
-VOK_COLD bool BucketMgr::FreeLow(void* p) {
+VOK_COLD bool BucketMgr::FreeLowAddress(void* p) {
   if (p == nullptr) return false;
   return Observers::Watching() ? FreeInstrumented(p) : FreeSlow(p);
 }

@@ -1,5 +1,5 @@
 // One pool: its snapshot of the settings, its table of size classes, its list of ExtRecs. The
-// operations of a request stand in Road.h, which sees all that they meet.
+// fast paths of Alloc and Free are in FastPath.h, which includes all that they use.
 // Test: tests/bucketmgr_test.cpp.
 #ifndef VOK_MEMPOOL_BUCKETMGR_H
 #define VOK_MEMPOOL_BUCKETMGR_H
@@ -28,8 +28,8 @@ class Mgr;
 /// - numExtRecs is the length of the list at extRecs
 /// - with `enabled` false every entry and extRecs are null
 ///
-/// It opens with what names the pool, and closes with what the road of a request reads beside the
-/// table: the two switches, and the rule that needs exactly the bytes they leave.
+/// It opens with what names the pool, and closes with what the fast path reads beside the table:
+/// the two switches, and the fast index, which needs exactly the bytes they leave.
 struct BucketMgr {
   std::string name;            ///< the pool's name, also its key in the registry
   Mgr* mgr;                    ///< the public handle; the engine doesn't read it
@@ -43,7 +43,7 @@ struct BucketMgr {
   std::uint32_t minRecSize;    ///< record size at index 0, to which smaller records are lifted
   bool keepEmptyBuckets;       ///< an emptied bucket stays
   bool enabled;                ///< the pool pools; false: every request goes to the heap
-  IndexRule indexRule;         ///< derived from the sizes: the short way to an index
+  FastIndex fastIndex;         ///< derived from the sizes: from a size to its index
 
   /// Takes the snapshot and makes the table. Ends the process if the settings make a pool
   /// impossible; throws what `operator new[]` throws.
@@ -102,7 +102,7 @@ private:
   void* AllocSlow(std::uint32_t size);
   void* AllocExtRec(std::uint32_t size);
   bool FreeSlow(void* p);
-  bool FreeLow(void* p);
+  bool FreeLowAddress(void* p);
 
   void* AllocInstrumented(std::uint32_t size);
   void* AllocReported(std::uint32_t size);
@@ -124,7 +124,7 @@ static_assert(offsetof(BucketMgr, extRecs) - offsetof(BucketMgr, mgr) == 2 * siz
 static_assert(offsetof(BucketMgr, numGroups) - offsetof(BucketMgr, mgr) == 3 * sizeof(void*));
 static_assert(offsetof(BucketMgr, keepEmptyBuckets) - offsetof(BucketMgr, numGroups) == 6 * 4);
 static_assert(offsetof(BucketMgr, enabled) - offsetof(BucketMgr, numGroups) == 6 * 4 + 1);
-static_assert(offsetof(BucketMgr, indexRule) - offsetof(BucketMgr, numGroups) == 6 * 4 + 2);
+static_assert(offsetof(BucketMgr, fastIndex) - offsetof(BucketMgr, numGroups) == 6 * 4 + 2);
 static_assert(sizeof(void*) != 4 || sizeof(std::string) != 24 || sizeof(BucketMgr) == 64);
 static_assert(sizeof(void*) != 8 || sizeof(std::string) != 32 || sizeof(BucketMgr) == 88);
 

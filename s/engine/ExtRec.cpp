@@ -1,4 +1,4 @@
-// The operations of an ExtRec; none is on the road of a pooled request.
+// The operations of an ExtRec; none is on the fast path.
 // Test: tests/bucketmgr_test.cpp.
 #include "engine/ExtRec.h"
 

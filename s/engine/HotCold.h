@@ -1,6 +1,6 @@
-// The attributes that keep the road of a request straight: what every request runs is inlined
+// The attributes that keep the fast path straight-line code: what every request runs is inlined
 // into one piece, what few requests run stands out of line and is reached by a tail call.
-// Test: scripts/check-road.
+// Test: scripts/check-fast-path.
 #ifndef VOK_MEMPOOL_HOTCOLD_H
 #define VOK_MEMPOOL_HOTCOLD_H
 

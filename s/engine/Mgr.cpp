@@ -3,9 +3,9 @@
 #include "MemPool"
 
 #include "engine/BucketMgr.h"
+#include "engine/FastPath.h"
 #include "engine/Invariants.h"
 #include "engine/KeepStores.h"
-#include "engine/Road.h"
 #include "services/Messages.h"
 #include "services/MgrRegistry.h"
 

@@ -64,14 +64,14 @@ constexpr std::uint32_t LargestAtIndex0(std::uint32_t minRecSize, std::uint32_t 
   return dataSize;
 }
 
-/// The short way from a size to its index, for the road of a request: a shift and a subtraction in
-/// place of the rounding, two compares and a division.
+/// From a size to its index on the fast path: a shift and a subtraction in place of the rounding,
+/// two compares and a division.
 ///
 /// It holds for sizes that have a class of their own. For all others, and for all sizes of a pool
 /// whose alignment is no power of two, it gives an index beyond the table or one whose entry stays
-/// null, and the request takes the written rule: size 0 (size - 1 wraps), sizes that are lifted
-/// (the bias makes them wrap), sizes above the largest record.
-struct IndexRule {
+/// null, and the request takes the general mapping: size 0 (size - 1 wraps), sizes that are
+/// clamped up to the minimum (the bias makes them wrap), sizes above the largest record.
+struct FastIndex {
   std::uint8_t shift;
   std::int8_t bias;
 
@@ -80,19 +80,19 @@ struct IndexRule {
   }
 };
 
-/// The rule that leads every size beyond the table.
-inline constexpr IndexRule noIndexRule{31, 127};
+/// Leads every size beyond the table.
+inline constexpr FastIndex noFastIndex{31, 127};
 
-/// The rule of a pool with these normalised sizes.
-constexpr IndexRule MakeIndexRule(std::uint32_t minRecSize, std::uint32_t maxRecSize,
+/// The fast index of a pool with these normalised sizes.
+constexpr FastIndex MakeFastIndex(std::uint32_t minRecSize, std::uint32_t maxRecSize,
                                   std::uint32_t alignment) {
-  if (!std::has_single_bit(alignment)) return noIndexRule;
+  if (!std::has_single_bit(alignment)) return noFastIndex;
   // With one class and an alignment above the header's size, a size of `maxRecSize` bytes would
   // reach the class, though its record doesn't fit.
-  if (minRecSize == maxRecSize && alignment > recHeaderSize) return noIndexRule;
+  if (minRecSize == maxRecSize && alignment > recHeaderSize) return noFastIndex;
   const auto bias = static_cast<std::int32_t>(minRecSize / alignment) - 1 -
                     static_cast<std::int32_t>(recHeaderSize / alignment);
-  if (bias > INT8_MAX) return noIndexRule;
+  if (bias > INT8_MAX) return noFastIndex;
   return {static_cast<std::uint8_t>(std::countr_zero(alignment)), static_cast<std::int8_t>(bias)};
 }
 

@@ -24,7 +24,6 @@ void VokHeaptrackGone(void*) VOK_WEAK("heaptrack_free");
 
 namespace VOK::MemPool::Observers {
 
-bool present = false;
 std::uint8_t watching = 0;
 
 namespace {
@@ -114,20 +113,20 @@ void Gone(void* p) {
 
 void Begin() {
   Memcheck::isThere = Memcheck::Look();
-  present = Memcheck::isThere || AddressSanitizer::IsThere() || Heaptrack::IsThere();
-  SetTracing(IsTracing());
+  if (Memcheck::isThere || AddressSanitizer::IsThere() || Heaptrack::IsThere())
+    watching |= watchingChecker;
 }
 
 bool IsTracing() {
-  return (std::atomic_ref<std::uint8_t>(watching).load(std::memory_order_relaxed) &
-          watchingTrace) != 0;
+  return (std::atomic_ref(watching).load(std::memory_order_relaxed) & watchingTrace) != 0;
 }
 
-// One store of the whole byte: the other bit doesn't change after the load.
+// A load and a store: the other bit never changes any more, and the last of two calls counts.
 void SetTracing(bool on) {
-  const int bits = (on ? watchingTrace : 0) | (present ? watchingChecker : 0);
-  std::atomic_ref<std::uint8_t>(watching).store(static_cast<std::uint8_t>(bits),
-                                                std::memory_order_relaxed);
+  const std::atomic_ref byte(watching);
+  const int others = byte.load(std::memory_order_relaxed) & ~watchingTrace;
+  byte.store(static_cast<std::uint8_t>(others | (on ? watchingTrace : 0)),
+             std::memory_order_relaxed);
 }
 
 void BlockMade(void* block, std::size_t size) {

@@ -12,17 +12,17 @@
 
 namespace VOK::MemPool::Observers {
 
-/// A checker is there.
-extern VOK_HIDDEN bool present;
-
 /// Why a request leaves the fast path, bit by bit: trace is on, a checker is there. The first bit
-/// is the trace switch itself: a copy of it could disagree when two threads set it at once.
+/// is the trace switch itself: a copy of it could disagree when two threads set it at once. The
+/// second one never changes after the load.
 extern VOK_HIDDEN std::uint8_t watching;
 inline constexpr std::uint8_t watchingTrace = 1;
 inline constexpr std::uint8_t watchingChecker = 2;
 
-inline bool Present() { return present; }
 VOK_HOT bool Watching() { return watching != 0; }
+
+/// Whether a checker is there.
+inline bool Present() { return (watching & watchingChecker) != 0; }
 
 /// The trace switch, which any thread may read and set at any time. A request that runs at the same
 /// time reads the byte without synchronisation and takes either value.

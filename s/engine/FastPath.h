@@ -1,8 +1,8 @@
 // The fast path of a request, from the handle to the record and back. One header sees the pool, its
 // Groups and its buckets, so that Mgr.cpp compiles it to straight-line code.
 // Test: tests/bucketmgr_test.cpp, tests/model_test.cpp.
-#ifndef VOK_MEMPOOL_ROAD_H
-#define VOK_MEMPOOL_ROAD_H
+#ifndef VOK_MEMPOOL_FASTPATH_H
+#define VOK_MEMPOOL_FASTPATH_H
 
 #include "engine/Bucket.h"
 #include "engine/BucketMgr.h"
@@ -18,7 +18,7 @@ namespace VOK::MemPool {
 // Alloc and Free fall back on the slow path, which serves every case, where the fast index finds no
 // Group.
 VOK_HOT Group* BucketMgr::FastGroup(std::uint32_t size) const {
-  const std::uint32_t index = indexRule.IndexOf(size);
+  const std::uint32_t index = fastIndex.IndexOf(size);
   return index < numGroups ? groups[index] : nullptr;
 }
 
@@ -33,15 +33,16 @@ VOK_HOT void* BucketMgr::Alloc(std::uint32_t size) {
   return group->Alloc();
 }
 
-/// Up to here a header can lead to a bucket at address 0; from here on it can't.
-inline constexpr std::uintptr_t lowAddresses = maxBucketSize + recsBaseOffset + sizeof(Rec);
+/// From a pointer above this address no offset leads to a bucket at address 0. So one compare
+/// stands for two tests: of the pointer, and of the bucket that its header leads to.
+inline constexpr std::uintptr_t lowestAddress = maxBucketSize + recsBaseOffset + sizeof(Rec);
 
 // The Group that the pool has for the bucket's record size is the bucket's parent if the bucket is
 // this pool's. Where a released bucket was, that pointer can be anything: it is compared and never
 // followed.
 VOK_HOT bool BucketMgr::Free(void* p) {
-  if (reinterpret_cast<std::uintptr_t>(p) <= lowAddresses) [[unlikely]]
-    return FreeLow(p);
+  if (reinterpret_cast<std::uintptr_t>(p) <= lowestAddress) [[unlikely]]
+    return FreeLowAddress(p);
   if (Observers::Watching()) [[unlikely]]
     return FreeInstrumented(p);
   if (!enabled) [[unlikely]]
