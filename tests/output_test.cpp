@@ -3,6 +3,7 @@
 #include "support/Process.h"
 
 #include "MemPool"
+#include "diagnostics/ReportText.h"
 #include "engine/Bucket.h"
 #include "engine/BucketMgr.h"
 #include "services/Messages.h"
@@ -71,6 +72,15 @@ TEST(OutputLine, HasTheTextOfInsertions) {
         (output.Width(width) << number << "end").End();
         expected << "text" << number << std::setw(width) << number << "end\n";
         EXPECT_EQ(line.str(), expected.str());
+
+        // An address is as the platform writes it in the classic locale.
+        const auto* const p = reinterpret_cast<const void*>(static_cast<std::uintptr_t>(number));
+        std::ostringstream address;
+        address << std::setw(8) << p;
+        EXPECT_EQ(PtrText(p), address.str());
+        address.str("");
+        address << std::hex << p;
+        EXPECT_EQ(BarePtrText(p).text, address.str().substr(address.str().starts_with("0x") * 2));
       }
 }
 

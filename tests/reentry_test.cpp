@@ -1,5 +1,4 @@
-// Calls that come at an unusual time: a new-handler that uses the pool whose Alloc is out of
-// memory, and a handle's destructor that runs twice.
+// A new-handler that uses the pool whose Alloc is out of memory.
 #include "support/ArenaHeap.h"
 
 #include "MemPool"
@@ -77,15 +76,6 @@ TEST(NewHandler, MayUseThePoolThatIsOutOfMemory) {
   ZOR_VOK_MEMPOOL_ON(false);
   ZOR_VOK_MEMPOOL_BUCKET_SIZE(4010);
   ZOR_VOK_MEMPOOL_MAX_RECORD_SIZE(1000);
-}
-
-TEST(Handle, DestroyedTwiceIsDestroyedOnce) {
-  alignas(Mgr) unsigned char place[sizeof(Mgr)];
-  auto* const mgr = new (place) Mgr("twice");
-  mgr->~Mgr();
-  EXPECT_EQ(mgr->GetBucketMgr(), nullptr);
-  mgr->~Mgr();
-  EXPECT_EQ(GetMgr("twice"), nullptr);
 }
 
 } // namespace

@@ -2,6 +2,7 @@
 
 #include "MemPool"
 
+#include <algorithm>
 #include <cstddef>
 #include <gtest/gtest.h>
 #include <new>
@@ -19,34 +20,27 @@ TEST(Vector, GrowsByItsRules) {
   ArenaHeap heap;
   {
     Vector v;
-    const auto once = [](const auto& call) {
-      const ArenaHeap::Use use;
-      call();
-    };
-    const auto twice = [&](const auto& call) {
-      const std::vector<std::uint32_t> before(v.begin(), v.end());
-      const unsigned capacity = v.capacity;
+    std::vector<std::uint32_t> expected;
+    // Appends a new number or, of the block that goes, an own one; or reserves as many.
+    for (const char step : std::string("0nnnno8;3nnnnnnn")) {
+      const std::uint32_t number = step == 'o' ? v[1] : 100 + v.count, capacity = v.capacity;
+      const auto act = [&] {
+        const ArenaHeap::Use use;
+        step == 'n'   ? v.Append(number)
+        : step == 'o' ? v.Append(v[1])
+                      : v.Reserve(static_cast<std::uint32_t>(step - '0'));
+      };
       heap.FailAt(1);
       try {
-        once(call);
+        act();
       } catch (const std::bad_alloc&) {
-        EXPECT_TRUE(std::equal(v.begin(), v.end(), before.begin(), before.end()));
-        EXPECT_EQ(v.capacity, capacity);
-        once(call);
+        EXPECT_TRUE(std::ranges::equal(v, expected) && v.capacity == capacity);
+        act();
       }
-    };
-    twice([&] { v.Reserve(0); });
-    for (std::uint32_t i = 0; i < 4; ++i)
-      twice([&] { v.Append(100 + i); });
-    twice([&] { v.Append(v[1]); }); // of the block that goes
-    for (const unsigned room : {8u, 11u, 3u})
-      twice([&] { v.Reserve(room); });
-    for (std::uint32_t i = 5; i < 12; ++i)
-      twice([&] { v.Append(100 + i); });
-    EXPECT_EQ(
-        std::vector<std::uint32_t>(v.begin(), v.end()),
-        (std::vector<std::uint32_t>{100, 101, 102, 103, 101, 105, 106, 107, 108, 109, 110, 111}));
-    EXPECT_TRUE(v.count == 12 && v.capacity == 22 && v[11] == 111);
+      if (step >= 'n') expected.push_back(number);
+      EXPECT_TRUE(std::ranges::equal(v, expected) && v.count == expected.size());
+    }
+    EXPECT_TRUE(v.capacity == 22 && v[11] == 111);
   }
   std::string blocks;
   for (const ArenaHeap::Event& event : heap.events)

@@ -1,6 +1,6 @@
 // The operations of a pool while trace is on or a memory-checking tool is present. The tools learn
 // of blocks and records here and nowhere else, so that buckets, Groups and ExtRecs know of none.
-// Test: tests/trace_test.cpp, tests/process_test.py.
+// Test: tests/output_test.cpp, tests/process_test.py.
 #include "engine/Bucket.h"
 #include "engine/BucketMgr.h"
 #include "engine/ExtRec.h"

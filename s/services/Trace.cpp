@@ -1,5 +1,5 @@
 // The four trace lines.
-// Test: tests/trace_test.cpp.
+// Test: tests/output_test.cpp.
 #include "services/Trace.h"
 
 #include "services/OutputLine.h"

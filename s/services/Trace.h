@@ -1,6 +1,6 @@
 // The trace lines of all pools and the test of their switch. A line is reported after the fact or
 // in a destructor, so it allocates nothing and throws nothing: OutputLine sees to both.
-// Test: tests/trace_test.cpp.
+// Test: tests/output_test.cpp.
 #ifndef VOK_MEMPOOL_TRACE_H
 #define VOK_MEMPOOL_TRACE_H
 
