@@ -192,7 +192,6 @@ TEST_F(Pools, IsValidSeesEachDamage) {
   damage(pool.maxRecSize, {4, 17, 20});
   damage(pool.bucketSize, {19, 25});
   damage(partly.parent, {&group + 1});
-  damage(pool.keepEmptyBuckets, {false});
   damage(const_cast<BucketMgr*&>(group.owner), {nullptr});
   damage(pool.groups[1], {&group});
   damage(pool.enabled, {false});

@@ -22,7 +22,6 @@ Bucket* Bucket::Create(Group* parent, std::uint32_t bucketSize, std::uint16_t da
   return b;
 }
 
-// Chains all records in ascending order, so that the first request gets the lowest one.
 void Bucket::Carve() {
   const std::uint32_t stride = recSize;
   const std::uint32_t last = recsSize - stride;

@@ -85,6 +85,10 @@ struct Bucket {
   /// REQUIRES: `p` is a used record of this bucket.
   void PushRec(void* p);
 
+  /// Makes every record free, in ascending order, so that the first request gets the lowest one.
+  /// REQUIRES: recsSize and recSize are set.
+  void Carve();
+
   /// How many records the bucket has; stored nowhere, so it costs a division. A damaged header that
   /// gives no number counts as none.
   std::uint32_t TotalRecs() const {
@@ -110,8 +114,6 @@ struct Bucket {
            bool showFreeList) const;
 
 private:
-  void Carve();
-
   void DbgHistogram(std::ostream& os, std::uint32_t depth) const;
   void DbgRecs(std::ostream& os, std::uint32_t depth) const;
   void DbgMap(std::ostream& os) const;

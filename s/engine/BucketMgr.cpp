@@ -8,6 +8,7 @@
 #include "engine/FastPath.h"
 #include "engine/Group.h"
 #include "engine/KeepStores.h"
+#include "services/HeapTop.h"
 #include "services/Messages.h"
 #include "services/Observers.h"
 #include "services/Settings.h"
@@ -41,6 +42,7 @@ BucketMgr::BucketMgr(Mgr* mgr_, const std::string& name_)
   numGroups = (maxRecSize - minRecSize) / dataAlignment + 1;
   fastIndex = MakeFastIndex(minRecSize, maxRecSize, dataAlignment);
   groups = new Group* [numGroups] {};
+  if (enabled) HeapTop::KeepSlack();
 }
 
 BucketMgr::~BucketMgr() {
@@ -132,6 +134,25 @@ bool BucketMgr::Contains(const void* p) const {
 void BucketMgr::Clear() noexcept {
   const Observers::Quiet quiet;
   ReportAllGone();
+  const HeapTop::Plug plug(std::size_t{GetNumBuckets()} * bucketSize);
+  ReleaseExtRecs();
+  ForEachGroup(*this, [this](Group& group, std::uint32_t i) {
+    group.Clear();
+    delete &group;
+    groups[i] = nullptr;
+  });
+}
+
+bool BucketMgr::Reset() noexcept {
+  if (!enabled) return false;
+  const Observers::Quiet quiet;
+  ReportAllFree();
+  ReleaseExtRecs();
+  ForEachGroup(*this, [](Group& group, std::uint32_t) { group.Reset(); });
+  return true;
+}
+
+void BucketMgr::ReleaseExtRecs() noexcept {
   for (ExtRec* e = extRecs; e != nullptr;) {
     ExtRec* const next = e->next;
     ExtRec::Destroy(e);
@@ -139,11 +160,6 @@ void BucketMgr::Clear() noexcept {
   }
   extRecs = nullptr;
   numExtRecs = 0;
-  ForEachGroup(*this, [this](Group& group, std::uint32_t i) {
-    group.Clear();
-    delete &group;
-    groups[i] = nullptr;
-  });
 }
 
 std::uint32_t BucketMgr::GetNumBuckets() const {

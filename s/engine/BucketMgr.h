@@ -65,6 +65,10 @@ struct BucketMgr {
   /// Releases all records and size classes; the table, the name and the snapshot stay.
   void Clear() noexcept;
 
+  /// Releases all ExtRecs and makes all records free; the buckets and size classes stay. False,
+  /// with nothing changed, if `enabled` is false.
+  bool Reset() noexcept;
+
   /// The capacity of a record, the requested size of an ExtRec, 0 for anything else.
   std::uint32_t GetSize(const void* p) const;
 
@@ -103,11 +107,13 @@ private:
   void* AllocExtRec(std::uint32_t size);
   bool FreeSlow(void* p);
   bool FreeLowAddress(void* p);
+  void ReleaseExtRecs() noexcept;
 
   void* AllocInstrumented(std::uint32_t size);
   void* AllocReported(std::uint32_t size);
   bool FreeInstrumented(void* p);
   bool FreeReported(void* p);
+  void ReportAllFree() const;
   void ReportAllGone() const;
 
   void DbgHistogram(std::ostream& os, std::uint32_t depth, const SizeFreqMap& sizes) const;

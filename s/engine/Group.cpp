@@ -72,6 +72,16 @@ void Group::Clear() noexcept {
   numBuckets = numFreeBuckets = 0;
 }
 
+void Group::Reset() noexcept {
+  for (Bucket* b = head1; b != nullptr; b = b->next1) {
+    b->Carve();
+    b->next2 = b->next1;
+    b->prev2 = b->prev1;
+  }
+  head2 = head1;
+  numFreeBuckets = numBuckets;
+}
+
 void Group::Link(Bucket* b) {
   assert(b->freeRecs == totalRecs);
   ++numBuckets;

@@ -32,6 +32,14 @@ void ReportRecordGone(Bucket* b, void* p) {
   Observers::RecordGone(b, p, b->recSize - recHeaderSize);
 }
 
+template <class Visit>
+void ForEachBucket(const BucketMgr& pool, Visit visit) {
+  ForEachGroup(pool, [visit](const Group& group, std::uint32_t) {
+    for (Bucket* b = group.head1; b != nullptr; b = b->next1)
+      visit(b);
+  });
+}
+
 } // namespace
 
 VOK_COLD void* BucketMgr::AllocInstrumented(std::uint32_t size) {
@@ -77,19 +85,22 @@ bool BucketMgr::FreeReported(void* p) {
   return FreeSlow(p);
 }
 
-void BucketMgr::ReportAllGone() const {
+void BucketMgr::ReportAllFree() const {
   if (!Observers::Present()) return;
   for (ExtRec* e = extRecs; e != nullptr; e = e->next)
     ReportGone(e);
-  ForEachGroup(*this, [](const Group& group, std::uint32_t) {
-    for (Bucket* b = group.head1; b != nullptr; b = b->next1) {
-      ForEachRecord(*b, [b](std::uint32_t offset) {
-        if (Rec* const rec = b->RecAt(offset); rec->type == RecType::Used)
-          ReportRecordGone(b, rec->Data());
-      });
-      ReportGone(b);
-    }
+  ForEachBucket(*this, [](Bucket* b) {
+    ForEachRecord(*b, [b](std::uint32_t offset) {
+      if (Rec* const rec = b->RecAt(offset); rec->type == RecType::Used)
+        ReportRecordGone(b, rec->Data());
+    });
   });
+}
+
+void BucketMgr::ReportAllGone() const {
+  if (!Observers::Present()) return;
+  ReportAllFree();
+  ForEachBucket(*this, [](Bucket* b) { ReportGone(b); });
 }
 
 } // namespace VOK::MemPool

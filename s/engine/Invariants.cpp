@@ -74,7 +74,6 @@ bool IsValid(const Group& group) {
     if (b->recSize != group.dataSize + recHeaderSize || b->TotalRecs() != group.totalRecs ||
         b->recsSize > group.owner->bucketSize || !IsValid(*b))
       return false;
-    if (b->freeRecs == group.totalRecs && !group.owner->keepEmptyBuckets) return false;
     if (b->freeRecs > 0) ++withFree;
   }
   if (count != group.numBuckets || prev != group.tail1) return false;

@@ -66,6 +66,11 @@ void Mgr::Clear() {
   bucketMgr->Clear();
 }
 
+bool Mgr::Reset() {
+  const Checked checked(bucketMgr);
+  return bucketMgr->Reset();
+}
+
 unsigned Mgr::GetSize(const void* p) const { return bucketMgr->GetSize(p); }
 
 bool Mgr::Contains(const void* p) const { return bucketMgr->Contains(p); }

@@ -71,6 +71,7 @@ private:
     const unsigned rare = Byte();
     if (rare < 16) Destroy(pool);
     if (rare >= 16 && rare < 32) Clear(pool);
+    if (rare >= 32 && rare < 64) Reset(pool);
   }
 
   void Make(Pool& pool) {
@@ -115,6 +116,10 @@ private:
   void Clear(Pool& pool) {
     Both([&] { return pool.mgr->Clear(), 0; }, [&] { return pool.reference->Clear(), 0; });
     if (pool.reference->settings.on) pool.live.clear();
+  }
+  void Reset(Pool& pool) {
+    if (Both([&] { return pool.mgr->Reset(); }, [&] { return pool.reference->Reset(); }) == true)
+      pool.live.clear();
   }
   void Alloc(Pool& pool) {
     const std::uint32_t byte = Byte();

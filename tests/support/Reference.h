@@ -151,6 +151,18 @@ public:
     buckets.clear();
     Refresh();
   }
+  bool Reset() {
+    if (!settings.on) return false;
+    Refresh();
+    for (std::uint8_t* ext : std::exchange(exts, {}))
+      Release(Form::Array, ext);
+    for (auto& [index, group] : groups) {
+      group.withFree = group.all;
+      for (std::uint8_t* bucket : group.all)
+        buckets[bucket].free = NewList(group);
+    }
+    return true;
+  }
   std::size_t NumBuckets() const { return buckets.size(); }
   /// The bucket around an address, null if there is none.
   std::uint8_t* Around(std::uint8_t* p) const {
@@ -222,11 +234,8 @@ private:
     }
     Group& group = groups[index];
     if (group.withFree.empty()) {
-      const std::uint32_t total = Total(group);
-      std::uint8_t* const at = Take(Form::Array, base + 2 + total * group.recSize);
-      buckets[at] = {&group, {}, nullptr};
-      for (std::uint32_t k = total; k > 0; --k)
-        buckets[at].free.push_back(2 + (k - 1) * group.recSize);
+      std::uint8_t* const at = Take(Form::Array, base + 2 + Total(group) * group.recSize);
+      buckets[at] = {&group, NewList(group), nullptr};
       group.all.push_front(at);
       group.withFree.push_front(at);
     }
@@ -266,6 +275,14 @@ private:
   }
   std::uint32_t Total(const Group& group) const {
     return (settings.bucketSize - 2) / group.recSize;
+  }
+
+  // The free list of a new bucket.
+  std::vector<std::uint32_t> NewList(const Group& group) const {
+    std::vector<std::uint32_t> free;
+    for (std::uint32_t k = Total(group); k > 0; --k)
+      free.push_back(2 + (k - 1) * group.recSize);
+    return free;
   }
 
   void RefreshBucket(std::uint8_t* at) {
