@@ -7,6 +7,7 @@
 //   mixed/LIVE               the same with 2 % of 1 to 64 KiB
 //   nodes/map, list, umap    1,000 entries put in, looked at and taken out
 //   clear/SIZE/COUNT         COUNT records built and all released at once
+//   reset/SIZE/COUNT         the same by Reset; an allocator without it frees each
 //   threads/COUNT            churn/2000 in COUNT threads, each with a pool of its own
 //   replay/NAME TRACE        a recorded program, again and again in one process, with its pool's
 //   making
@@ -105,7 +106,9 @@ bool Contend(const Request& ask) {
   else if (ask.Is("nodes", 2) && ask.Text(1) == "umap")
     Serve(HashNodes<Rival>());
   else if (ask.Is("clear", 3))
-    Serve(Clear<Rival>(ask.Number(1), ask.Number(2)));
+    Serve(Drop<Rival>(ask.Number(1), ask.Number(2), false));
+  else if (ask.Is("reset", 3))
+    Serve(Drop<Rival>(ask.Number(1), ask.Number(2), true));
   else if (ask.Is("threads", 2))
     Serve(Threads<Rival>(ask.Number(1), 2000), CLOCK_MONOTONIC);
   else if (ask.Is("replay", 3) || ask.Is("fresh", 3))

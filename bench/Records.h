@@ -158,12 +158,14 @@ private:
   std::vector<std::uint32_t> sums;
 };
 
-/// `count` records built and all released at once, by each rival's own way; the heap has none and
+/// `count` records built and all freed at once by the allocator's own call, if it has one: by
+/// Reset, which keeps the memory, where that is asked for, otherwise by Clear. Another allocator
 /// frees each.
 template <class Rival>
-class Clear {
+class Drop {
 public:
-  Clear(std::uint32_t size_, std::uint32_t count) : size(size_), taken(count) {}
+  Drop(std::uint32_t size_, std::uint32_t count, bool resets_)
+      : size(size_), resets(resets_), taken(count) {}
 
   std::uint32_t Run(std::uint32_t times) {
     std::uint32_t sum = 0;
@@ -172,21 +174,29 @@ public:
         p = Take(rival, size, time).p;
       for (std::size_t i = 0; i < taken.size(); i += sample)
         sum += Read(taken[i], size);
-      if constexpr (requires { rival.Clear(); })
-        rival.Clear();
-      else
-        for (void* const p : taken)
-          rival.Free(p, size);
+      FreeAll();
     }
     return sum;
   }
 
 private:
+  void FreeAll() {
+    if constexpr (requires { rival.Reset(); }) {
+      if (resets) return rival.Reset();
+    }
+    if constexpr (requires { rival.Clear(); }) {
+      if (!resets) return rival.Clear();
+    }
+    for (void* const p : taken)
+      rival.Free(p, size);
+  }
+
   // Reading all would hide what is gained by not visiting each record.
   static constexpr std::size_t sample = 64;
 
   Rival rival;
   std::uint32_t size;
+  bool resets;
   std::vector<void*> taken;
 };
 

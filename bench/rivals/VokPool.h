@@ -22,6 +22,7 @@ public:
   void* Alloc(std::uint32_t size) { return mgr.Alloc(size); }
   void Free(void* p, std::uint32_t) { mgr.Free(p); }
   void Clear() { mgr.Clear(); }
+  void Reset() { mgr.Reset(); }
 
   /// A block aligned to 8, under the default settings. At 8-byte pointers a bucket's first data
   /// lies 52 bytes into its heap block. Where the stride is a multiple of 8, all its data is 4 off
