@@ -100,7 +100,7 @@ constexpr struct {
     {"turn", [](State& s) { std::reverse(s.pools.begin(), s.pools.end()); }},
     {"drop", [](State& s) { delete &s.Pool(), s.pools.pop_back(); }},
     {"clear", [](State& s) { s.Pool().Clear(); }},
-    {"report", [](State& s) { s.Pool().DbgDetailed(); }},
+    {"report", [](State&) { DbgDetailed(); }},
     {"alloc", Alloc},
     {"free", [](State& s) { std::cout << (s.Pool().Free(s.Block()) ? "freed\n" : "refused\n"); }},
     {"size", [](State& s) { std::cout << s.Pool().GetSize(s.Block()) << '\n'; }},
@@ -153,10 +153,11 @@ char* secure_getenv(const char* key) noexcept {
 #endif
 
 int main(int, char** argv) {
-  std::istringstream scripts(argv[1]);
-  std::string script;
-  static std::string lastScript;
-  std::getline(std::getline(scripts, script, '|'), lastScript);
-  std::atexit([] { Run(lastScript); });
-  Run(script);
+  static std::istringstream scripts(argv[1]);
+  const auto runNext = [] {
+    std::string script;
+    Run(std::getline(scripts, script, '|') ? script : "");
+  };
+  std::atexit(runNext);
+  runNext();
 }

@@ -37,10 +37,9 @@ def used_in(bucket):
 
 
 def looks_of(bucket):
-    used, rows = len(used_in(bucket)), len(bucket["records"]["rows"])
-    served_next = min(rows - used, 1)
-    free = rows - used - served_next
-    return dict(used=used, free=free, next=served_next, damaged=0, came=0, went=0)
+    used = len(used_in(bucket))
+    free = len(bucket["records"]["rows"]) - used
+    return dict(used=used, free=max(free - 1, 0), next=min(free, 1), damaged=0, came=0, went=0)
 
 
 def test_one(browser, text):
@@ -52,10 +51,10 @@ def test_one(browser, text):
                      for row in bucket["freeList"]["rows"]) for bucket in pool] for pool in pools]
     same(browser.evaluate(LINKS), links, "the links")
 
-    def tip_has(part, *keys):
-        browser.press(*keys)
+    def tip_has(part, *what, act=browser.press):
+        act(*what)
         tip = browser.evaluate("(tip.element.hidden ? 'hidden' : '') + tip.element.innerText")
-        same(part in tip, True, f"{keys}: {tip!r} lacks {part!r}")
+        same(part in tip, True, f"{what}: {tip!r} lacks {part!r}")
 
     bucket = pools[0][0]
     rows = bucket["records"]["rows"]
@@ -68,12 +67,10 @@ def test_one(browser, text):
     tip_has(f"offset\n{bucket['freeList']['rows'][0]['next']} to", "n")
     tip_has("hidden", "Escape")
     x, y = browser.evaluate(CORNER)
-    for point, move, part in (((1, 1), browser.move, "hidden"),
-                              ((x, y), browser.move, f"record 1 of {len(rows)}\n"),
-                              ((1, 1), browser.move, "hidden"),
-                              ((x + 12, y), browser.tap, f"record 4 of {len(rows)}\n")):
-        move(*point)
-        tip_has(part)
+    tip_has("hidden", 1, 1, act=browser.move)
+    tip_has(f"record 1 of {len(rows)}\n", x, y, act=browser.move)
+    tip_has("hidden", 1, 1, act=browser.move)
+    tip_has(f"record 4 of {len(rows)}\n", x + 12, y, act=browser.tap)
     browser.evaluate("document.querySelector('.head').querySelectorAll('button')[2].focus()")
     browser.press("Enter")
     same(browser.evaluate("document.querySelectorAll('.strips .row > span')[2].innerText"),
