@@ -16,6 +16,14 @@
 
 #ifdef _WIN32
 #include <windows.h>
+
+// What the platform has instead, under the names that the rest of this program uses.
+constexpr int RTLD_NOW = 0;
+static void* dlopen(const char* path, int) { return LoadLibraryA(path); }
+static void* dlsym(void* library, const char* name) {
+  return reinterpret_cast<void*>(GetProcAddress(static_cast<HMODULE>(library), name));
+}
+static void dlclose(void* library) { FreeLibrary(static_cast<HMODULE>(library)); }
 #else
 #include <dlfcn.h>
 #endif
@@ -41,16 +49,6 @@ namespace {
 auto& ownState = *new State;
 void* handle;
 decltype(&Act) actOfClient;
-
-#ifdef _WIN32
-// What the platform has instead, under the names that the rest of this program uses.
-constexpr int RTLD_NOW = 0;
-void* dlopen(const char* path, int) { return LoadLibraryA(path); }
-void* dlsym(void* library, const char* name) {
-  return reinterpret_cast<void*>(GetProcAddress(static_cast<HMODULE>(library), name));
-}
-void dlclose(void* library) { FreeLibrary(static_cast<HMODULE>(library)); }
-#endif
 
 // The compiler takes dlopen for a function that never throws. Only a call that it can't see
 // through leaves the caller a way to catch what a load throws.
@@ -153,11 +151,10 @@ char* secure_getenv(const char* key) noexcept {
 #endif
 
 int main(int, char** argv) {
-  static std::istringstream scripts(argv[1]);
-  const auto runNext = [] {
-    std::string script;
-    Run(std::getline(scripts, script, '|') ? script : "");
-  };
-  std::atexit(runNext);
-  runNext();
+  std::istringstream scripts(argv[1]);
+  std::string script;
+  static std::string lastScript;
+  std::getline(std::getline(scripts, script, '|'), lastScript);
+  std::atexit([] { Run(lastScript); });
+  Run(script);
 }

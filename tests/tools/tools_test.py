@@ -44,10 +44,8 @@ COMMANDS = [
     ("report --json --check", "", 2, "", "*[--summary,--json,--check,--text]" + USAGE),
     ("report /no/such", "", 1, "", "/no/such: can't be opened: No such file or directory\n"),
     ("report /", "", 1, "", "/: can't be read: Is a directory\n"),
-    ("report", "", 1, "", "-: there is no report in it\n"),
     ("report", "MemPool::Mgr a\n" + 60 * "x", 1, "",
      "-: line 2: expected \"   Version     : \"*, found \"" + 60 * "x" + "\"\n"),
-    ("report --from-json", "{", 1, "", "-: not a document of reports: *"),
     ("report --from-json", '{"other": [{}], "reports": []}', 1, "",
      "-: there is no report in it\n"),
     ("report", DEMO.replace(" demo", " de\tmo") + DETAILED, 0, """\
@@ -62,7 +60,6 @@ detailed         25         27          3      12349968      12349032  100.0 %
     ("picture report.txt", "", 2, "", "--output is required" + USAGE),
     ("picture -o page.html", "", 2, "", "REPORT is required" + USAGE),
     ("picture - -o -", DETAILED, 0, "<!DOCTYPE html>\n*</html>\n", ""),
-    ("picture - -o cut.html", DETAILED[:4000], 1, "", "-: line *: expected *"),
     ("picture - -o plain.html", DEMO, 1, "", PLAIN + "; DbgDetailed writes them\n"),
     ("picture - -o page.html", DEMO + DETAILED, 0, "", PLAIN + "\n"),
     ("trace", "", 1, "", "-: there is no trace line in it\n"),
@@ -96,7 +93,7 @@ def same_as_golden(name, text):
 
 def is_like(text, form):
     """A star stands for any text, and nothing else of a form is special."""
-    return fnmatchcase(text, re.sub(r"([\[?])", r"[\1]", form))
+    return fnmatchcase(text, re.sub(r"[\[?]", r"[\g<0>]", form))
 
 
 def test_commands():
@@ -151,16 +148,16 @@ def changed_reports():
     """The line and the text of a change: every second value is another one of its width, every
     second line is gone, and the end is."""
     others = {"USED": "UNKN", "FREE": "USED", " + ": "   ", "9": "8", "f": "e"}
-    places = re.finditer(r"(?<![\w.])(?:0x[0-9a-f]+|\d+)|USED|FREE|\*+| \+ ", DETAILED)
-    for found in list(places)[::2]:
-        old, line = found[0], DETAILED.count("\n", 0, found.start()) + 1
-        new = others.get(old) or old[:-1] + (others.get(old[-1]) or chr(ord(old[-1]) + 1))
-        yield line, DETAILED[:found.start()] + new + DETAILED[found.end():]
-    lines = DETAILED.splitlines(True)
-    for i in range(0, len(lines), 2):
-        yield i + 1, "".join(lines[:i] + lines[i + 1:])
-    for end in range(0, len(DETAILED), 97):
-        yield DETAILED.count("\n", 0, end) + 1, DETAILED[:end]
+
+    def another(old):
+        return others.get(old) or old[:-1] + (others.get(old[-1]) or chr(ord(old[-1]) + 1))
+
+    values = re.finditer(r"(?<![\w.])(?:0x[0-9a-f]+|\d+)|USED|FREE|\*+| \+ ", DETAILED)
+    changes = [(*found.span(), another(found[0])) for found in list(values)[::2]]
+    changes += [(*found.span(), "") for found in list(re.finditer(".*\n", DETAILED))[::2]]
+    changes += [(end, len(DETAILED), "") for end in range(0, len(DETAILED), 97)]
+    for start, end, new in changes:
+        yield DETAILED.count("\n", 0, start) + 1, DETAILED[:start] + new + DETAILED[end:]
 
 
 def changed_documents(document):
@@ -218,22 +215,21 @@ def test_library():
         same(run(PROGRAM, "report", "--check", given=text), ("", "", 0), f"seed {seed}")
         data_of(first.replace("\n", "\r\n"))
         data = data_of(second)
-        found = [bytes.fromhex(pool["nameBytes"]) if "nameBytes" in pool
-                 else pool["name"].encode("latin-1") for pool in data]
-        same(sorted(found), sorted(name.encode("latin-1") for name in names), "the names")
+        found = [bytes.fromhex(pool.get("nameBytes", "")).decode("latin-1") or pool["name"]
+                 for pool in data]
+        same(sorted(found), sorted(names), "the names")
         if off:
             continue
-        trace = work.output[:work.ends[1]]
-        named = [f"--name={addr}={name}"
-                 for addr, name in zip(re.findall("^zvpt:c:(.*)", trace, re.M), names)]
+        made = re.findall("^zvpt:c:(.*)", work.trace, re.M)
+        named = [f"--name={addr}={name}" for addr, name in zip(made, names)]
         if not clears:
-            again = tool("trace", "--detailed", "--at", trace.count("\n"), *named,
+            again = tool("trace", "--detailed", "--at", work.trace.count("\n"), *named,
                          given=work.output, keys=work.keys)
             same(numbered(again), numbered(second), f"seed {seed}")
         used = {int(row["data"], 16) for pool in data for row in pool["extRecs"]["rows"]}
         used.update(int(row["addr"], 16) + 4 for pool in data for bucket in pool["bucketReports"]
                     for row in bucket["records"]["rows"] if row["type"] == "USED")
-        live = json.loads(tool("trace", "--json", given=trace))["live"]
+        live = json.loads(tool("trace", "--json", given=work.trace))["live"]
         certain = {int(row["data"], 16) for row in live if not row["uncertain"]}
         same(certain - used, set(), f"the live records of seed {seed}")
 
@@ -248,20 +244,19 @@ OTHER = ("zvpt", "")
 
 def lines_at_random(draw, steps, wild):
     """Trace lines: requests of fresh addresses and Frees of live ones, but a share of anything."""
-    held, lines = [], []
+    held = []
     for step in range(steps):
         pool = draw.choice(("a0", "b0", "c0"))
         if draw.random() < wild:
             data = draw.choice(held)[1] if held else "5"
-            lines.append(draw.choice(EVENTS + MIXED + OTHER + 4 * (
+            yield draw.choice(EVENTS + MIXED + OTHER + 4 * (
                 f"zvpt:c:{pool}", f"zvpt:d:{pool}", f"zvpt:a:{pool}:{data}:{step % 30}",
-                f"zvpt:f:{pool}:{data}:")))
+                f"zvpt:f:{pool}:{data}:"))
         elif not held or draw.random() < .65:
             held.append((pool, f"{step * 16 + 16:x}"))
-            lines.append("zvpt:a:{}:{}:{}".format(*held[-1], draw.randrange(100)))
+            yield "zvpt:a:{}:{}:{}".format(*held[-1], draw.randrange(100))
         else:
-            lines.append("zvpt:f:{}:{}:".format(*held.pop(draw.randrange(len(held)))))
-    return lines
+            yield "zvpt:f:{}:{}:".format(*held.pop(draw.randrange(len(held))))
 
 
 def literal(lines):
@@ -283,7 +278,7 @@ def literal(lines):
                 "pool": addr, "name": None, "made": number if letter == "c" else None, "gone": None,
                 "requests": 0, "frees": 0, "peakBytes": 0, "numClears": 0, "clears": []})
         if letter == "a":
-            owner = pools[old["pool"]] if old else None
+            owner = old and pools[old["pool"]]
             if old and old["uncertain"]:
                 owner["clears"][-1]["after"] = max(owner["clears"][-1]["after"], old["line"])
             elif old:
@@ -331,8 +326,8 @@ def literal(lines):
 def test_trace():
     for seed in range(30):
         draw = random.Random(seed)
-        lines = lines_at_random(draw, draw.randrange(1, 600) if seed else 5000,
-                                draw.choice((.02, .1, .5)) if seed else .02)
+        steps, wild = (draw.randrange(1, 600), draw.choice((.02, .1, .5))) if seed else (5000, .02)
+        lines = list(lines_at_random(draw, steps, wild))
         course, expected = literal(lines)
         text = "".join(f"{line}\n" for line in lines)
         found = json.loads(tool("trace", "--json", "--massif", "massif", given=text))
