@@ -15,34 +15,23 @@
 
 using namespace VOK::MemPool::Tools;
 
-namespace {
-
-void ReadText(const std::string& input) {
-  const std::vector<Report> reports = ReadReports(input);
-  std::string json;
-  WriteJson(reports, [&](std::string_view piece) { json += piece; });
-  const std::vector<Report> again = ReadJson(json);
-  bool isSame = again.size() == reports.size();
-  for (std::size_t i = 0; isSame && i < reports.size(); ++i) {
-    const std::string text = WriteReport(reports[i]);
-    isSame = input.find(text) != std::string::npos && WriteReport(again[i]) == text;
-    CheckReport(reports[i]);
-  }
-  Summarise(reports);
-  const PictureSource source{"fuzz", reports};
-  if (!isSame || PictureData(&source, source).find('<') != std::string::npos) std::abort();
-}
-
-} // namespace
-
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   const std::string input(reinterpret_cast<const char*>(data), size);
+  const bool isText = !input.starts_with('{');
   try {
-    if (!input.starts_with('{'))
-      ReadText(input);
-    else
-      for (const Report& report : ReadJson(input))
-        CheckReport(report);
+    const std::vector<Report> reports = isText ? ReadReports(input) : ReadJson(input);
+    std::string json;
+    WriteJson(reports, [&](std::string_view piece) { json += piece; });
+    const std::vector<Report> again = ReadJson(json);
+    if (again.size() != reports.size()) std::abort();
+    for (std::size_t i = 0; i < reports.size(); ++i) {
+      const std::string text = WriteReport(reports[i]);
+      if (WriteReport(again[i]) != text || (isText && input.find(text) == input.npos)) std::abort();
+      CheckReport(reports[i]);
+    }
+    Summarise(reports);
+    const PictureSource source{"fuzz", reports};
+    if (PictureData(&source, source).find('<') != std::string::npos) std::abort();
   } catch (const Failure&) { // the text is refused
   }
   return 0;

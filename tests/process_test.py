@@ -11,10 +11,11 @@ import shutil
 import subprocess
 import sys
 
-# A call on each line, "[PROGRAM] [KEY=VALUE]... : OPERATION; ... | OPERATION AT EXIT; ...", and after
-# "->" what it writes, line by line, with a "!" before a line on the error stream, and its status, if
-# it isn't 0. A line that begins with a blank goes on with the one above. ON=* stands for both values.
-# The statements of messages are numbered within a paragraph.
+# A call on each line, "[PROGRAM] [KEY=VALUE]... : OPERATION; ... | OPERATION AT EXIT; ...", and
+# after "->" what it writes, line by line, with a "!" before a line on the error stream, and its
+# status, if it isn't 0. A line that begins with a blank goes on with the one above. The first word
+# may be some that take turns: ON=* stands for ON=0|ON=1. The statements of messages are numbered
+# within a paragraph.
 CALLS = """
 # What passes each key's test, and the banner.
 INFO=0 : say main -> banner 4010 4 0 1000 8 0 1; main
@@ -107,14 +108,12 @@ memcheck ON=1 KEEP_EMPTY_BUCKETS=1 : pool a; alloc 11; alloc 100; free 1; alloc 
     ~ ::Alloc\(.*pool_child.cpp
 heaptrack ON=1 KEEP_EMPTY_BUCKETS=1 : pool a; alloc 11; alloc 100; free 1; alloc 10; forget
     -> ~ (?m)^21B leaked over ~ (?s)^(?!.*Bucket::Create)
-"""
+
 # What neither of two may find. A second Free is refused.
-for checker in ("memcheck", "asan"):
-    FAULTS += f"""
-{checker} ON=1 : pool a; alloc 10; alloc 10; free 1; free 1; size 1; contains 1; drop
+memcheck|asan ON=1 : pool a; alloc 10; alloc 10; free 1; free 1; size 1; contains 1; drop
     -> freed; refused; 0; 0
-{checker} ON=1 : pool a; alloc 13; alloc 5000; report; free 0; free 1; alloc 996; clear; alloc 8; drop
-    -> ~ ^$
+memcheck|asan ON=1 : pool a; alloc 13; alloc 5000; report; free 0; free 1; alloc 996; clear;
+    alloc 8; drop -> ~ ^$
 """
 COMMANDS = {
     "memcheck": "exec valgrind -q --leak-check=full --error-exitcode=9 ../pool_child {}",
@@ -157,9 +156,9 @@ def calls_in(text):
     """The calls, each with its outcome and its paragraph."""
     for paragraph in text.split("\n\n"):
         for line in re.sub("\n +", " ", paragraph).splitlines():
-            for on in "01" if line.startswith("ON=*") else "1":
-                if line and line[0] != "#":
-                    yield *line.replace("ON=*", f"ON={on}").split(" -> "), paragraph
+            turns, _, rest = line.replace("ON=*", "ON=0|ON=1").partition(" ")
+            for turn in turns.split("|") if turns.strip("#") else ():
+                yield *f"{turn} {rest}".split(" -> "), paragraph
 
 
 def run(calls):
@@ -167,10 +166,8 @@ def run(calls):
     the output, the error output and the status of each."""
     script = ""
     for i, call in enumerate(calls):
-        words, operations = call.split(":", 1)
-        words = words.split()
-        program = "pool_child" if not words or "=" in words[0] else words.pop(0)
-        keys = [word if word.startswith("ZOR") else f"ZOR_VOK_MEMPOOL_{word}" for word in words]
+        program, keys, operations = re.match(r"(?:(\w+) )?(.*?):(.*)", call).groups("pool_child")
+        keys = [key if key.startswith("ZOR") else f"ZOR_VOK_MEMPOOL_{key}" for key in keys.split()]
         if program == "pool_host":  # a client that is unloaded loses its pool
             keys.append("LSAN_OPTIONS=detect_leaks=0")
         if WINDOWS:
@@ -214,7 +211,7 @@ def main():
     text = FAULTS if OBSERVERS else CALLS + (ON_WINDOWS if WINDOWS else ON_LINUX)
     calls = list(calls_in(text))
     statements = collections.defaultdict(lambda: collections.defaultdict(itertools.count(1).__next__))
-    failed = False
+    failures = []
     for (call, expected, paragraph), (out, err, status) in zip(calls, run([c[0] for c in calls])):
         expected, *patterns = expected.split("~ ")
         numbers = statements[paragraph]
@@ -223,10 +220,10 @@ def main():
             lines = [f"no {pattern}" for pattern in patterns if not re.search(pattern.strip(), err)]
         if int(status):
             lines.append("aborted" if int(status) in ABORTED else f"status {int(status)}")
-        if "; ".join(lines) != expected.strip():
-            failed = True
-            print(f"{call}\n-> {'; '.join(lines)}\nnot {expected}\n{err if patterns else ''}")
-    sys.exit(failed)
+        found = "; ".join(lines)
+        if found != expected.strip():
+            failures.append(f"{call}\n-> {found}\nnot {expected}\n{err if patterns else ''}")
+    sys.exit("\n".join(failures) or None)
 
 
 main()

@@ -16,6 +16,14 @@
 
 #ifdef _WIN32
 #include <windows.h>
+
+// What the platform has instead, under the names that the rest of this program uses.
+constexpr int RTLD_NOW = 0;
+static void* dlopen(const char* path, int) { return LoadLibraryA(path); }
+static void* dlsym(void* library, const char* name) {
+  return reinterpret_cast<void*>(GetProcAddress(static_cast<HMODULE>(library), name));
+}
+static void dlclose(void* library) { FreeLibrary(static_cast<HMODULE>(library)); }
 #else
 #include <dlfcn.h>
 #endif
@@ -41,16 +49,6 @@ namespace {
 auto& ownState = *new State;
 void* handle;
 decltype(&Act) actOfClient;
-
-#ifdef _WIN32
-// What the platform has instead, under the names that the rest of this program uses.
-constexpr int RTLD_NOW = 0;
-void* dlopen(const char* path, int) { return LoadLibraryA(path); }
-void* dlsym(void* library, const char* name) {
-  return reinterpret_cast<void*>(GetProcAddress(static_cast<HMODULE>(library), name));
-}
-void dlclose(void* library) { FreeLibrary(static_cast<HMODULE>(library)); }
-#endif
 
 // The compiler takes dlopen for a function that never throws. Only a call that it can't see
 // through leaves the caller a way to catch what a load throws.
@@ -100,7 +98,7 @@ constexpr struct {
     {"turn", [](State& s) { std::reverse(s.pools.begin(), s.pools.end()); }},
     {"drop", [](State& s) { delete &s.Pool(), s.pools.pop_back(); }},
     {"clear", [](State& s) { s.Pool().Clear(); }},
-    {"report", [](State& s) { s.Pool().DbgDetailed(); }},
+    {"report", [](State&) { DbgDetailed(); }},
     {"alloc", Alloc},
     {"free", [](State& s) { std::cout << (s.Pool().Free(s.Block()) ? "freed\n" : "refused\n"); }},
     {"size", [](State& s) { std::cout << s.Pool().GetSize(s.Block()) << '\n'; }},

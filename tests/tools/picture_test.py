@@ -14,14 +14,11 @@ sys.path.insert(0, str(Path(__file__).resolve().parents[2] / "scripts"))
 from browser import Browser
 from support import Work, data_of, same, tool
 
-LOOKS = "pools.map((pool) => pool.buckets.map((bucket) => countLooks(bucket)))"
-LINKS = """pools.map((pool) => pool.buckets.map((bucket) => [...bucket.unpacked.type.keys()]
-  .filter((i) => bucket.unpacked.type[i] === Type.free)
-  .map((i) => [bucket.offsetOf(i), bucket.unpacked.next[i], bucket.addressOf(i)])))"""
+BUCKETS = """pools.map((pool) => pool.buckets.map((bucket) => [countLooks(bucket),
+  [...bucket.unpacked.type.keys()].filter((i) => bucket.unpacked.type[i] === Type.free)
+  .map((i) => [bucket.offsetOf(i), bucket.unpacked.next[i], bucket.addressOf(i)])]))"""
 CHANGES = """pools.map((pool) => [pool.came, pool.went,
   pool.buckets.map(countLooks).reduce((sum, looks) => sum + looks.came, 0)])"""
-CORNER = """[document.querySelector('.strips canvas').getBoundingClientRect()]
-  .flatMap((box) => [box.left + 3, box.top + 10])"""
 
 
 def draw(browser, *reports):
@@ -36,26 +33,25 @@ def used_in(bucket):
     return {row["offset"] for row in bucket["records"]["rows"] if row["type"] == "USED"}
 
 
-def looks_of(bucket):
-    used, rows = len(used_in(bucket)), len(bucket["records"]["rows"])
-    served_next = min(rows - used, 1)
-    free = rows - used - served_next
-    return dict(used=used, free=free, next=served_next, damaged=0, came=0, went=0)
+def looks_and_links_of(bucket):
+    used = len(used_in(bucket))
+    free = len(bucket["records"]["rows"]) - used
+    looks = dict(used=used, free=max(free - 1, 0), next=min(free, 1), damaged=0, came=0, went=0)
+    links = [[row[key] for key in ("offset", "next", "addr")] for row in bucket["freeList"]["rows"]]
+    return [looks, sorted(links)]
 
 
 def test_one(browser, text):
     """The cells, the links, the keyboard, the pointer and the order."""
     draw(browser, text)
     pools = [pool["bucketReports"] for pool in data_of(text)]
-    same(browser.evaluate(LOOKS), [list(map(looks_of, pool)) for pool in pools], "the cells")
-    links = [[sorted([row[key] for key in ("offset", "next", "addr")]
-                     for row in bucket["freeList"]["rows"]) for bucket in pool] for pool in pools]
-    same(browser.evaluate(LINKS), links, "the links")
+    expected = [list(map(looks_and_links_of, pool)) for pool in pools]
+    same(browser.evaluate(BUCKETS), expected, "the cells and the links")
 
-    def tip_has(part, *keys):
-        browser.press(*keys)
+    def tip_has(part, *what, act=browser.press):
+        act(*what)
         tip = browser.evaluate("(tip.element.hidden ? 'hidden' : '') + tip.element.innerText")
-        same(part in tip, True, f"{keys}: {tip!r} lacks {part!r}")
+        same(part in tip, True, f"{what}: {tip!r} lacks {part!r}")
 
     bucket = pools[0][0]
     rows = bucket["records"]["rows"]
@@ -67,13 +63,12 @@ def test_one(browser, text):
     same("served next" in browser.evaluate("tip.spoken.innerText"), True, "what is said aloud")
     tip_has(f"offset\n{bucket['freeList']['rows'][0]['next']} to", "n")
     tip_has("hidden", "Escape")
-    x, y = browser.evaluate(CORNER)
-    for point, move, part in (((1, 1), browser.move, "hidden"),
-                              ((x, y), browser.move, f"record 1 of {len(rows)}\n"),
-                              ((1, 1), browser.move, "hidden"),
-                              ((x + 12, y), browser.tap, f"record 4 of {len(rows)}\n")):
-        move(*point)
-        tip_has(part)
+    x, y = browser.evaluate("""[document.querySelector('.strips canvas').getBoundingClientRect()]
+        .flatMap((box) => [box.left + 3, box.top + 10])""")
+    tip_has("hidden", 1, 1, act=browser.move)
+    tip_has(f"record 1 of {len(rows)}\n", x, y, act=browser.move)
+    tip_has("hidden", 1, 1, act=browser.move)
+    tip_has(f"record 4 of {len(rows)}\n", x + 12, y, act=browser.tap)
     browser.evaluate("document.querySelector('.head').querySelectorAll('button')[2].focus()")
     browser.press("Enter")
     same(browser.evaluate("document.querySelectorAll('.strips .row > span')[2].innerText"),

@@ -31,7 +31,7 @@ def tool(*arguments, given="", keys=None):
 
 def random_calls(draw, steps, clears, names, settings):
     """Calls of the child program on two pools, which it prints in detail behind each half of the
-    steps. The first one also gets a block of the other back, and some blocks twice."""
+    steps. The first one also gets a block of the other back."""
     largest, blocks = settings["MAX_RECORD_SIZE"], count(1)
     calls = [f"pool {name}" for name in names] + ["alloc 1"]
     pools = [(name, []) for name in names]
@@ -49,20 +49,17 @@ def random_calls(draw, steps, clears, names, settings):
         if settings["ON"] and name == names[0]:  # the heap takes no misuse
             if draw.random() < .05:
                 calls.append("free 0")
-            if settings["KEEP_EMPTY_BUCKETS"] and draw.random() < .05:  # its bucket stands
-                calls += ["alloc 1"] + [f"free {next(blocks)}"] * 2
             if draw.randrange(steps) < clears:  # proved where both requests get one address
                 calls += ["alloc 1", "clear", "alloc 1"]
                 held[:] = [next(blocks), next(blocks)][1:]
         if step in (steps // 2, steps):
-            both = ["report", "turn", "report", "turn"]  # in the order of their names
-            calls += both if name == min(names) else both[1:] + both[:1]
+            calls.append("report")
     return calls + ["drop", "drop"]
 
 
 class Work:
     """Two pools at random work under random settings: the program's output, and in it the trace
-    lines and reports in detail of one moment at half time and one at the end."""
+    lines and reports in detail of half time and of the end, which `trace` leads to."""
 
     def __init__(self, seed, steps, clears=0, names=("first", "second"), off=0):
         draw = random.Random(seed)
@@ -77,9 +74,9 @@ class Work:
         self.output, errors, status = run("setarch", "-R", POOLS, calls, keys=self.keys)
         same((errors, status), ("", 0), f"the pools of seed {seed}")
         titles = [found.start() for found in re.finditer("^MemPool::Mgr ", self.output, re.M)]
-        self.ends = titles[0], titles[2]
-        self.reports = [re.sub("^(zvpt:.*|freed|refused)\n", "", text, flags=re.M) for text in
-                        (self.output[:titles[2]], self.output[titles[2]:])]
+        self.trace = self.output[:titles[2]]
+        self.reports = [re.sub("^(zvpt:.*|freed|refused)\n", "", text, flags=re.M)
+                        for text in (self.trace, self.output[titles[2]:])]
 
 
 def data_of(text):
