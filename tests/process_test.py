@@ -114,10 +114,19 @@ memcheck|asan ON=1 : pool a; alloc 10; alloc 10; free 1; free 1; size 1; contain
     -> freed; refused; 0; 0
 memcheck|asan ON=1 : pool a; alloc 13; alloc 5000; report; free 0; free 1; alloc 996; clear;
     alloc 8; drop -> ~ ^$
+
+# How often the heap returns memory: never within the slack, once for a Clear or a pool beyond it.
+strace ON=1 : pool a; build 100; clear; build 1000; clear; build 10000; drop -> ~ ^0 shrinks
+strace ON=1 : pool a; build 20000; clear; build 20000; drop -> ~ ^2 shrinks
+trimming ON=1 : pool a; build 100; clear; build 1000; clear; build 10000; drop -> ~ ^3 shrinks
 """
+STRACE = "strace -e trace=brk -o calls ../pool_child {} && awk '/^brk/ {{ n += $NF \"\" < last; " \
+         "last = $NF }} END {{ print n, \"shrinks\" }}' calls >&2"
 COMMANDS = {
     "memcheck": "exec valgrind -q --leak-check=full --error-exitcode=9 ../pool_child {}",
     "asan": "exec ../pool_child_asan {}",
+    "strace": STRACE,
+    "trimming": "export MALLOC_TRIM_THRESHOLD_=131072; " + STRACE,
     "heaptrack": "heaptrack -o trace ../pool_child {} >/dev/null 2>&1 && "
                  "heaptrack_print -l 1 -a 0 -p 0 -T 0 trace.* >&2 2>/dev/null",
 }

@@ -118,12 +118,13 @@ void Begin() {
 }
 
 bool IsTracing() {
-  return (std::atomic_ref(watching).load(std::memory_order_relaxed) & watchingTrace) != 0;
+  return (std::atomic_ref<std::uint8_t>(watching).load(std::memory_order_relaxed) &
+          watchingTrace) != 0;
 }
 
 // A load and a store: the other bit never changes any more, and the last of two calls counts.
 void SetTracing(bool on) {
-  const std::atomic_ref byte(watching);
+  const std::atomic_ref<std::uint8_t> byte(watching);
   const int others = byte.load(std::memory_order_relaxed) & ~watchingTrace;
   byte.store(static_cast<std::uint8_t>(others | (on ? watchingTrace : 0)),
              std::memory_order_relaxed);

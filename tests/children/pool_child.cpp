@@ -69,6 +69,12 @@ void Alloc(State& s) {
   std::memset(s.blocks.back(), 1, std::min(s.Number(), 1U << 16));
 }
 
+// So many buckets, of four records each.
+void Build(State& s) {
+  for (unsigned i = 4 * s.Number(); i > 0; --i)
+    s.Pool().Alloc(992);
+}
+
 // The compiler must not drop a write that nobody reads.
 void Write(State& s) { static_cast<volatile char*>(s.blocks.back())[std::stol(s.operand)] = 2; }
 
@@ -97,6 +103,7 @@ constexpr struct {
     {"nameless", [](State& s) { s.pools.push_back(new Mgr); }},
     {"turn", [](State& s) { std::reverse(s.pools.begin(), s.pools.end()); }},
     {"drop", [](State& s) { delete &s.Pool(), s.pools.pop_back(); }},
+    {"build", Build},
     {"clear", [](State& s) { s.Pool().Clear(); }},
     {"report", [](State&) { DbgDetailed(); }},
     {"alloc", Alloc},
