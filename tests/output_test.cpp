@@ -3,6 +3,7 @@
 #include "support/Process.h"
 
 #include "MemPool"
+#include "base/PointerText.h"
 #include "diagnostics/ReportText.h"
 #include "engine/Bucket.h"
 #include "engine/BucketMgr.h"

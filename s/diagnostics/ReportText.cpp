@@ -2,7 +2,7 @@
 // Test: tests/report_test.cpp.
 #include "diagnostics/ReportText.h"
 
-#include "services/Trace.h"
+#include "base/PointerText.h"
 
 #include <cassert>
 

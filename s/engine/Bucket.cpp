@@ -2,7 +2,7 @@
 // Test: tests/bucketmgr_test.cpp, tests/model_test.cpp.
 #include "engine/Bucket.h"
 
-#include "engine/KeepStores.h"
+#include "base/KeepStores.h"
 
 #include <cassert>
 #include <new>

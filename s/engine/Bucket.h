@@ -4,7 +4,7 @@
 #ifndef VOK_MEMPOOL_BUCKET_H
 #define VOK_MEMPOOL_BUCKET_H
 
-#include "engine/HotCold.h"
+#include "base/Attributes.h"
 #include "engine/Rec.h"
 
 #include <cstddef>
@@ -95,8 +95,10 @@ struct Bucket {
     return recSize == 0 || recsSize < 2 ? 0 : (recsSize - 2u) / recSize;
   }
 
-  VOK_HOT std::uint8_t* RecsBase() { return reinterpret_cast<std::uint8_t*>(&freeRecs); }
-  VOK_HOT Rec* RecAt(std::uint32_t offset) { return reinterpret_cast<Rec*>(RecsBase() + offset); }
+  VOK_ALWAYS_INLINE std::uint8_t* RecsBase() { return reinterpret_cast<std::uint8_t*>(&freeRecs); }
+  VOK_ALWAYS_INLINE Rec* RecAt(std::uint32_t offset) {
+    return reinterpret_cast<Rec*>(RecsBase() + offset);
+  }
 
   const std::uint8_t* RecsBase() const { return reinterpret_cast<const std::uint8_t*>(&freeRecs); }
   const Rec* RecAt(std::uint32_t offset) const {
@@ -148,12 +150,12 @@ void ForEachRecord(const Bucket& bucket, Visit visit) {
 }
 
 // In numbers, since the compiler may take it for granted that no sum of a pointer is null.
-VOK_HOT Bucket* Bucket::OfUsed(const Rec* rec) {
+VOK_ALWAYS_INLINE Bucket* Bucket::OfUsed(const Rec* rec) {
   return reinterpret_cast<Bucket*>(reinterpret_cast<std::uintptr_t>(rec) - rec->Offset() -
                                    recsBaseOffset);
 }
 
-VOK_HOT void* Bucket::PopRec() {
+VOK_ALWAYS_INLINE void* Bucket::PopRec() {
   const std::uint16_t offset = freeHead;
   Rec* const rec = RecAt(offset);
   const std::uint16_t next = rec->Offset();
@@ -164,7 +166,7 @@ VOK_HOT void* Bucket::PopRec() {
   return rec->Data();
 }
 
-VOK_HOT void Bucket::PushRec(void* p) {
+VOK_ALWAYS_INLINE void Bucket::PushRec(void* p) {
   Rec* const rec = Rec::FromData(p);
   const std::uint16_t offset = rec->Offset();
   rec->SetOffset(freeHead);

@@ -3,11 +3,11 @@
 // Test: tests/bucketmgr_test.cpp.
 #include "engine/BucketMgr.h"
 
+#include "base/KeepStores.h"
 #include "engine/Bucket.h"
 #include "engine/ExtRec.h"
 #include "engine/FastPath.h"
 #include "engine/Group.h"
-#include "engine/KeepStores.h"
 #include "services/HeapTop.h"
 #include "services/Messages.h"
 #include "services/Observers.h"
@@ -54,20 +54,20 @@ BucketMgr::~BucketMgr() {
   KeepStores(this);
 }
 
-VOK_COLD void* BucketMgr::AllocSlow(std::uint32_t size) {
+VOK_NOINLINE void* BucketMgr::AllocSlow(std::uint32_t size) {
   if (!enabled) return ::operator new[](size);
   const std::uint32_t dataSize = RoundUp(size, dataAlignment);
   if (dataSize + recHeaderSize > maxRecSize) return AllocExtRec(size);
   return GroupFor(dataSize)->Alloc();
 }
 
-VOK_COLD void* BucketMgr::AllocExtRec(std::uint32_t size) {
+VOK_NOINLINE void* BucketMgr::AllocExtRec(std::uint32_t size) {
   ExtRec* const e = ExtRec::Create(size);
   e->Link(extRecs, numExtRecs);
   return e->Data();
 }
 
-VOK_COLD bool BucketMgr::FreeSlow(void* p) {
+VOK_NOINLINE bool BucketMgr::FreeSlow(void* p) {
   if (!enabled) {
     ::operator delete[](p);
     return true;
@@ -81,7 +81,7 @@ VOK_COLD bool BucketMgr::FreeSlow(void* p) {
   return true;
 }
 
-VOK_COLD bool BucketMgr::FreeLowAddress(void* p) {
+VOK_NOINLINE bool BucketMgr::FreeLowAddress(void* p) {
   if (p == nullptr) return false;
   return Observers::Watching() ? FreeInstrumented(p) : FreeSlow(p);
 }

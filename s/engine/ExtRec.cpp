@@ -2,7 +2,7 @@
 // Test: tests/bucketmgr_test.cpp.
 #include "engine/ExtRec.h"
 
-#include "engine/KeepStores.h"
+#include "base/KeepStores.h"
 
 #include <new>
 

@@ -4,10 +4,10 @@
 #ifndef VOK_MEMPOOL_FASTPATH_H
 #define VOK_MEMPOOL_FASTPATH_H
 
+#include "base/Attributes.h"
 #include "engine/Bucket.h"
 #include "engine/BucketMgr.h"
 #include "engine/Group.h"
-#include "engine/HotCold.h"
 #include "services/Observers.h"
 
 #include <cassert>
@@ -17,13 +17,13 @@ namespace VOK::MemPool {
 
 // Alloc and Free fall back on the slow path, which serves every case, where the fast index finds no
 // Group.
-VOK_HOT Group* BucketMgr::FastGroup(std::uint32_t size) const {
+VOK_ALWAYS_INLINE Group* BucketMgr::FastGroup(std::uint32_t size) const {
   const std::uint32_t index = fastIndex.IndexOf(size);
   return index < numGroups ? groups[index] : nullptr;
 }
 
 // A disabled pool needs no test here: all entries of its table are null.
-VOK_HOT void* BucketMgr::Alloc(std::uint32_t size) {
+VOK_ALWAYS_INLINE void* BucketMgr::Alloc(std::uint32_t size) {
   assert(size <= maxRequest);
   if (Observers::Watching()) [[unlikely]]
     return AllocInstrumented(size);
@@ -40,7 +40,7 @@ inline constexpr std::uintptr_t lowestAddress = maxBucketSize + recsBaseOffset +
 // The Group that the pool has for the bucket's record size is the bucket's parent if the bucket is
 // this pool's. Where a released bucket was, that pointer can be anything: it is compared and never
 // followed.
-VOK_HOT bool BucketMgr::Free(void* p) {
+VOK_ALWAYS_INLINE bool BucketMgr::Free(void* p) {
   if (reinterpret_cast<std::uintptr_t>(p) <= lowestAddress) [[unlikely]]
     return FreeLowAddress(p);
   if (Observers::Watching()) [[unlikely]]

@@ -22,7 +22,7 @@ Group::Group(BucketMgr* owner_, std::uint16_t dataSize_)
 
 // Out of memory, the heap runs the program's new-handler, which may clear the pool and with it
 // destroy this Group: the way goes on in the Group that the pool has afterwards.
-VOK_COLD void* Group::AllocFromNewBucket() {
+VOK_NOINLINE void* Group::AllocFromNewBucket() {
   BucketMgr* const pool = owner;
   const std::uint16_t size = dataSize;
   std::unique_ptr<Bucket, DestroyBucket> b(Bucket::Create(this, pool->bucketSize, size));
@@ -32,17 +32,17 @@ VOK_COLD void* Group::AllocFromNewBucket() {
   return group->Alloc();
 }
 
-VOK_COLD void* Group::UnlinkFull(Bucket* b, void* p) {
+VOK_NOINLINE void* Group::UnlinkFull(Bucket* b, void* p) {
   UnlinkFree(b);
   return p;
 }
 
-VOK_COLD bool Group::LinkRefilled(Bucket* b) {
+VOK_NOINLINE bool Group::LinkRefilled(Bucket* b) {
   LinkFree(b);
   return true;
 }
 
-VOK_COLD bool Group::ReleaseEmptied(Bucket* b) {
+VOK_NOINLINE bool Group::ReleaseEmptied(Bucket* b) {
   const bool wasFull = b->freeRecs == 1; // then it stands on the first list alone
   if (owner->keepEmptyBuckets) {
     if (wasFull) LinkFree(b);

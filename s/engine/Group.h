@@ -4,9 +4,9 @@
 #ifndef VOK_MEMPOOL_GROUP_H
 #define VOK_MEMPOOL_GROUP_H
 
+#include "base/Attributes.h"
 #include "engine/Bucket.h"
 #include "engine/BucketMgr.h"
-#include "engine/HotCold.h"
 
 #include <cstdint>
 
@@ -76,7 +76,7 @@ void ForEachGroup(const BucketMgr& pool, Visit visit) {
 }
 
 // The head of the second list is tested in place of its count, since it is needed next.
-VOK_HOT void* Group::Alloc() {
+VOK_ALWAYS_INLINE void* Group::Alloc() {
   Bucket* const b = head2;
   if (b == nullptr) [[unlikely]]
     return AllocFromNewBucket();
@@ -86,7 +86,7 @@ VOK_HOT void* Group::Alloc() {
   return p;
 }
 
-VOK_HOT bool Group::TakeBack(void* p, Bucket* bucket) {
+VOK_ALWAYS_INLINE bool Group::TakeBack(void* p, Bucket* bucket) {
   bucket->PushRec(p);
   const std::uint16_t freeRecs = bucket->freeRecs;
   if (freeRecs == totalRecs) [[unlikely]]

@@ -42,13 +42,13 @@ void ForEachBucket(const BucketMgr& pool, Visit visit) {
 
 } // namespace
 
-VOK_COLD void* BucketMgr::AllocInstrumented(std::uint32_t size) {
+VOK_NOINLINE void* BucketMgr::AllocInstrumented(std::uint32_t size) {
   void* const p = enabled && Observers::Present() ? AllocReported(size) : AllocSlow(size);
   if (Trace::IsOn()) Trace::Allocated(this, p, size);
   return p;
 }
 
-VOK_COLD bool BucketMgr::FreeInstrumented(void* p) {
+VOK_NOINLINE bool BucketMgr::FreeInstrumented(void* p) {
   if (Trace::IsOn()) Trace::Freed(this, p);
   return enabled && Observers::Present() ? FreeReported(p) : FreeSlow(p);
 }

@@ -2,10 +2,10 @@
 // Test: tests/registry_test.cpp, tests/process_test.py.
 #include "MemPool"
 
+#include "base/KeepStores.h"
 #include "engine/BucketMgr.h"
 #include "engine/FastPath.h"
 #include "engine/Invariants.h"
-#include "engine/KeepStores.h"
 #include "services/Messages.h"
 #include "services/MgrRegistry.h"
 
@@ -16,7 +16,7 @@ namespace VOK::MemPool {
 
 namespace {
 
-[[noreturn]] VOK_COLD void StopTooLarge(unsigned size) {
+[[noreturn]] VOK_NOINLINE void StopTooLarge(unsigned size) {
   Messages::Error({"Cannot allocate ", size, " bytes, ", "the maximum is ", maxRequest});
 }
 

@@ -5,7 +5,7 @@
 #ifndef VOK_MEMPOOL_REC_H
 #define VOK_MEMPOOL_REC_H
 
-#include "engine/HotCold.h"
+#include "base/Attributes.h"
 #include "engine/SizeClasses.h"
 
 #include <cstddef>
@@ -31,22 +31,22 @@ struct Rec {
   std::uint8_t type;       ///< a RecType: says which of the two offsets the header holds
   std::uint8_t unused;     ///< stays as the heap delivered it
 
-  static VOK_HOT Rec* FromData(void* p) {
+  static VOK_ALWAYS_INLINE Rec* FromData(void* p) {
     return reinterpret_cast<Rec*>(static_cast<std::uint8_t*>(p) - sizeof(Rec));
   }
-  static VOK_HOT const Rec* FromData(const void* p) {
+  static VOK_ALWAYS_INLINE const Rec* FromData(const void* p) {
     return reinterpret_cast<const Rec*>(static_cast<const std::uint8_t*>(p) - sizeof(Rec));
   }
 
-  VOK_HOT void* Data() { return this + 1; }
+  VOK_ALWAYS_INLINE void* Data() { return this + 1; }
 
   /// The one pair that accesses the 16-bit number. Each compiles to one access of two bytes on a
   /// little-endian machine; the writer only in this form, since g++ keeps two stores apart in
   /// Bucket::PushRec.
-  VOK_HOT std::uint16_t Offset() const {
+  VOK_ALWAYS_INLINE std::uint16_t Offset() const {
     return static_cast<std::uint16_t>(offsetLow | offsetHigh << 8);
   }
-  VOK_HOT void SetOffset(std::uint16_t offset) {
+  VOK_ALWAYS_INLINE void SetOffset(std::uint16_t offset) {
     const std::uint8_t bytes[] = {static_cast<std::uint8_t>(offset),
                                   static_cast<std::uint8_t>(offset >> 8)};
     std::memcpy(this, bytes, sizeof bytes);

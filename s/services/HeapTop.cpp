@@ -2,7 +2,7 @@
 // Test: tests/process_test.py.
 #include "services/HeapTop.h"
 
-#include "engine/KeepStores.h"
+#include "base/KeepStores.h"
 #include "services/Observers.h"
 
 #include <cstdlib>

@@ -1,9 +1,6 @@
-// The map's life, the automatic names, and the exported ways to find pools.
+// The map's life, and the automatic names.
 // Test: tests/registry_test.cpp.
 #include "services/MgrRegistry.h"
-
-#include "MemPool"
-#include "engine/BucketMgr.h"
 
 #include <algorithm>
 #include <cstddef>
@@ -47,24 +44,5 @@ std::string NextAutomaticName() {
 }
 
 } // namespace MgrRegistry
-
-Mgr* GetMgr(const char* name) {
-  BucketMgr* const pool = MgrRegistry::Find(name != nullptr ? name : "");
-  return pool != nullptr ? pool->mgr : nullptr;
-}
-
-void GetMgrs(vector<Mgr*>& mgrs) {
-  mgrs.Reserve(GetNumMgrs());
-  for (const auto& [name, pool] : MgrRegistry::Entries())
-    mgrs.Append(pool->mgr);
-}
-
-void GetMgrs(std::vector<Mgr*>& mgrs) {
-  mgrs.reserve(GetNumMgrs());
-  for (const auto& [name, pool] : MgrRegistry::Entries())
-    mgrs.push_back(pool->mgr);
-}
-
-unsigned GetNumMgrs() { return static_cast<unsigned>(MgrRegistry::Entries().size()); }
 
 } // namespace VOK::MemPool

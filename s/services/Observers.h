@@ -5,7 +5,7 @@
 #ifndef VOK_MEMPOOL_OBSERVERS_H
 #define VOK_MEMPOOL_OBSERVERS_H
 
-#include "engine/HotCold.h"
+#include "base/Attributes.h"
 
 #include <cstddef>
 #include <cstdint>
@@ -19,7 +19,7 @@ extern VOK_HIDDEN std::uint8_t watching;
 inline constexpr std::uint8_t watchingTrace = 1;
 inline constexpr std::uint8_t watchingChecker = 2;
 
-VOK_HOT bool Watching() { return watching != 0; }
+VOK_ALWAYS_INLINE bool Watching() { return watching != 0; }
 
 /// Whether a checker is there.
 inline bool Present() { return (watching & watchingChecker) != 0; }

@@ -5,7 +5,7 @@
 #ifndef VOK_MEMPOOL_SETTINGS_H
 #define VOK_MEMPOOL_SETTINGS_H
 
-#include "engine/HotCold.h"
+#include "base/Attributes.h"
 
 #include <cstdint>
 

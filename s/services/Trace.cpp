@@ -2,16 +2,10 @@
 // Test: tests/output_test.cpp.
 #include "services/Trace.h"
 
+#include "base/PointerText.h"
 #include "services/OutputLine.h"
 
-#include <charconv>
-
 namespace VOK::MemPool {
-
-BarePtrText::BarePtrText(const void* p) {
-  const auto address = reinterpret_cast<std::uintptr_t>(p);
-  *std::to_chars(text, text + sizeof text - 1, address, 16).ptr = '\0';
-}
 
 namespace Trace {
 

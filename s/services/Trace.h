@@ -12,14 +12,6 @@ namespace VOK::MemPool {
 
 struct BucketMgr;
 
-/// The text of a pointer as the platform's stream writes it in the classic locale, without a
-/// leading "0x".
-struct BarePtrText {
-  char text[2 * sizeof(void*) + 1];
-
-  explicit BarePtrText(const void* p);
-};
-
 namespace Trace {
 
 inline bool IsOn() { return Observers::IsTracing(); }

@@ -1,0 +1,29 @@
+// The exported functions that find pools by name or list all of them.
+// Test: tests/registry_test.cpp.
+#include "MemPool"
+
+#include "engine/BucketMgr.h"
+#include "services/MgrRegistry.h"
+
+namespace VOK::MemPool {
+
+Mgr* GetMgr(const char* name) {
+  BucketMgr* const pool = MgrRegistry::Find(name != nullptr ? name : "");
+  return pool != nullptr ? pool->mgr : nullptr;
+}
+
+void GetMgrs(vector<Mgr*>& mgrs) {
+  mgrs.Reserve(GetNumMgrs());
+  for (const auto& [name, pool] : MgrRegistry::Entries())
+    mgrs.Append(pool->mgr);
+}
+
+void GetMgrs(std::vector<Mgr*>& mgrs) {
+  mgrs.reserve(GetNumMgrs());
+  for (const auto& [name, pool] : MgrRegistry::Entries())
+    mgrs.push_back(pool->mgr);
+}
+
+unsigned GetNumMgrs() { return static_cast<unsigned>(MgrRegistry::Entries().size()); }
+
+} // namespace VOK::MemPool
