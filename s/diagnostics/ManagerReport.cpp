@@ -1,5 +1,5 @@
 // The report of a pool: one walk for its figures, the header block, then the histogram and the
-// tables, and in the detailed form the report of each bucket. The four entry points stand below.
+// tables, and in the detailed form the report of each bucket. The four entry points are at the end.
 // Test: tests/report_test.cpp.
 #include "MemPool"
 

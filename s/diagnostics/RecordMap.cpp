@@ -21,7 +21,7 @@ using Recs = vector<const Rec*>;
 /// The margin of every line but the heading and the size line.
 std::ostream& Margin(std::ostream& os) { return os << std::setw(5) << " "; }
 
-/// A value that fills its box from the left, with the wall behind it.
+/// A value that fills its box from the left, followed by the wall.
 template <class Value>
 void Box(std::ostream& os, int width, const Value& value) {
   os << std::left << std::setw(width) << value << std::right << "| ";

@@ -1,5 +1,5 @@
 // How a report reads the records of a bucket: by address, whatever the header says of them, and no
-// byte at or behind the end of the record area, so that a damaged header leads nowhere else.
+// byte at or after the end of the record area, so that a damaged header leads nowhere else.
 // Test: tests/report_test.cpp.
 #ifndef VOK_MEMPOOL_RECORDS_H
 #define VOK_MEMPOOL_RECORDS_H
@@ -16,7 +16,7 @@ namespace VOK::MemPool {
 /// The type byte of a record that has none within the area.
 inline constexpr std::uint8_t noType = 255;
 
-/// The type byte of the record at `offset`, read anew.
+/// The type byte of the record at `offset`, read again.
 inline std::uint8_t TypeAt(const Bucket& bucket, std::uint32_t offset) {
   return offset + offsetof(Rec, type) < bucket.recsSize ? bucket.RecAt(offset)->type : noType;
 }

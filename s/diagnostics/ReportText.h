@@ -15,7 +15,7 @@
 
 namespace VOK::MemPool {
 
-/// Three blanks for each step of depth.
+/// Three spaces for each step of depth.
 std::string Indent(std::uint32_t depth);
 
 /// The text of a pointer as the standard library's stream writes it under width 8 in the classic
@@ -46,7 +46,7 @@ public:
 
   Table& Row();
 
-  /// A cell with the separator behind it.
+  /// A cell followed by the separator.
   template <class Value>
   Table& Cell(const Value& value) {
     LastCell(value);
@@ -54,7 +54,7 @@ public:
     return *this;
   }
 
-  /// A cell with nothing behind it.
+  /// A cell with no separator.
   template <class Value>
   Table& LastCell(const Value& value) {
     os.width(NextWidth());
@@ -62,7 +62,7 @@ public:
     return *this;
   }
 
-  /// A cell of blanks.
+  /// A cell of spaces.
   Table& Blank() { return Cell(" "); }
 
   /// A zero-filled number in a cell.
@@ -74,7 +74,7 @@ public:
   /// `stars` stars in place of a cell. REQUIRES: at least one.
   Table& Bar(std::uint32_t stars);
 
-  /// A text right behind what the row has.
+  /// A text right after what the row has.
   Table& Text(const char* text);
 
   /// Ends the row. REQUIRES: it has a cell in each column.

@@ -1,4 +1,4 @@
-// The used sizes of a report: how many live records there are of each. It is filled anew for each
+// The used sizes of a report: how many live records there are of each. It is filled again for each
 // report, from the standard allocator, so that a report changes no figure that it prints. A struct
 // around the map, since the engine's headers name it without a look inside.
 // Test: tests/report_test.cpp.

@@ -67,11 +67,11 @@ struct Bucket {
 
   /// Scrubs the header, so that a stale pointer into the bucket is not taken for a record, and
   /// returns the block to the heap. Does nothing for null and for a scrubbed bucket.
-  /// REQUIRES: the bucket stands on no list.
+  /// REQUIRES: the bucket is on no list.
   static void Destroy(Bucket* b) noexcept;
 
   /// The bucket that holds the used record of data pointer `p`, null for every other pointer of a
-  /// pool. Reads 4 bytes in front of `p` and, if they look used, the header that they lead to.
+  /// pool. Reads the 4 bytes before `p` and, if they look used, the header that they lead to.
   static Bucket* FromData(const void* p);
 
   /// Where the bucket lies if `rec` is a used record of one: two subtractions from the header.

@@ -40,7 +40,7 @@ struct BucketMgr {
   std::uint32_t bucketSize;    ///< the most bytes of a bucket's record area
   std::uint32_t dataAlignment; ///< the multiple to which sizes are rounded, never 0
   std::uint32_t maxRecSize;    ///< largest record that a bucket serves
-  std::uint32_t minRecSize;    ///< record size at index 0, to which smaller records are lifted
+  std::uint32_t minRecSize;    ///< record size at index 0, to which smaller ones are clamped up
   bool keepEmptyBuckets;       ///< an emptied bucket stays
   bool enabled;                ///< the pool pools; false: every request goes to the heap
   FastIndex fastIndex;         ///< derived from the sizes: from a size to its index
@@ -123,7 +123,7 @@ private:
   void DbgExtRecs(std::ostream& os, std::uint32_t depth) const;
 };
 
-// The leading string's size is the standard library's; behind it nothing is padded between fields.
+// The leading string's size is the standard library's; after it nothing is padded between fields.
 static_assert(offsetof(BucketMgr, mgr) == sizeof(std::string));
 static_assert(offsetof(BucketMgr, groups) - offsetof(BucketMgr, mgr) == 1 * sizeof(void*));
 static_assert(offsetof(BucketMgr, extRecs) - offsetof(BucketMgr, mgr) == 2 * sizeof(void*));

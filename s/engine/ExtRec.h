@@ -1,5 +1,5 @@
 // A heap block of its own for a request too large for any bucket, on a list of its pool. Its header
-// ends in the shape of a record's, so that a bare data pointer tells one from the other.
+// ends in the shape of a record's, so that a bare data pointer distinguishes the two.
 // Test: tests/bucketmgr_test.cpp.
 #ifndef VOK_MEMPOOL_EXTREC_H
 #define VOK_MEMPOOL_EXTREC_H
@@ -18,7 +18,7 @@ namespace VOK::MemPool {
 ///      4   8 +--------------------------+
 ///            | prev                     |
 ///      8  16 +--------------------------+
-///            | length                   |  8 bytes in front of the data at either width
+///            | length                   |  8 bytes before the data at either width
 ///     12  20 +------+------+------+-----+
 ///            | 0xAA | 0xBB | type | 0xCC|  a record's header with type Ext
 ///     16  24 +------+------+------+-----+
@@ -41,10 +41,10 @@ struct ExtRec {
   static void Destroy(ExtRec* e) noexcept;
 
   /// The ExtRec whose data pointer `p` is, null for every other pointer of a pool and for an
-  /// ExtRec of length 0. Reads up to 8 bytes in front of `p`.
+  /// ExtRec of length 0. Reads up to 8 bytes before `p`.
   static ExtRec* FromData(const void* p);
 
-  /// Whether this record can stand on the list of `head`: false shows that it belongs to another
+  /// Whether this record can be on the list of `head`: false shows that it belongs to another
   /// pool; true proves no more than that its neighbours agree. Constant time.
   bool FitsList(const ExtRec* head) const;
 
@@ -52,7 +52,7 @@ struct ExtRec {
   void Link(ExtRec*& head, std::uint32_t& count);
 
   /// Takes this record out of the list.
-  /// REQUIRES: it stands on the list of `head`.
+  /// REQUIRES: it is on the list of `head`.
   void Unlink(ExtRec*& head, std::uint32_t& count);
 
   /// Zeroes the header, so that a stale pointer is not taken for an ExtRec.

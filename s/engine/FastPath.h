@@ -34,7 +34,7 @@ VOK_ALWAYS_INLINE void* BucketMgr::Alloc(std::uint32_t size) {
 }
 
 /// From a pointer above this address no offset leads to a bucket at address 0. So one compare
-/// stands for two tests: of the pointer, and of the bucket that its header leads to.
+/// makes two tests: of the pointer, and of the bucket that its header leads to.
 inline constexpr std::uintptr_t lowestAddress = maxBucketSize + recsBaseOffset + sizeof(Rec);
 
 // The Group that the pool has for the bucket's record size is the bucket's parent if the bucket is

@@ -43,7 +43,7 @@ VOK_NOINLINE bool Group::LinkRefilled(Bucket* b) {
 }
 
 VOK_NOINLINE bool Group::ReleaseEmptied(Bucket* b) {
-  const bool wasFull = b->freeRecs == 1; // then it stands on the first list alone
+  const bool wasFull = b->freeRecs == 1; // then it is on the first list alone
   if (owner->keepEmptyBuckets) {
     if (wasFull) LinkFree(b);
     return true;

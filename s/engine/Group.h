@@ -13,7 +13,7 @@
 namespace VOK::MemPool {
 
 /// Both lists put new entries at the head.
-/// - a bucket is on the first list from its making to its release
+/// - a bucket is on the first list from its creation to its release
 /// - a bucket is on the second list exactly while it has a free record
 /// - numBuckets and numFreeBuckets are the lists' lengths, so numFreeBuckets == 0 exactly when
 ///   head2 is null

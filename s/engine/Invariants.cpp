@@ -1,4 +1,4 @@
-// Each walk restates the equations that stand above the struct, and no more.
+// Each walk restates the equations above the struct, and no more.
 // Test: tests/model_test.cpp.
 #include "engine/Invariants.h"
 

@@ -1,5 +1,5 @@
 // The invariants of a bucket, a group and a pool, walked. Built for the tests and the checked
-// flavour alone.
+// configuration alone.
 // Test: tests/model_test.cpp.
 #ifndef VOK_MEMPOOL_INVARIANTS_H
 #define VOK_MEMPOOL_INVARIANTS_H
@@ -18,8 +18,8 @@ bool IsValid(const Bucket& bucket);
 bool IsValid(const Group& group);
 bool IsValid(const BucketMgr& pool);
 
-/// Stands at the head of an operation on a pool; in the checked flavour it walks the pool at the
-/// operation's end, also when an exception leaves it, and elsewhere it is nothing.
+/// Begins an operation on a pool; in the checked configuration it walks the pool at the operation's
+/// end, also when an exception leaves it, and elsewhere it does nothing.
 class Checked {
 #ifdef VOK_MEMPOOL_CHECKED
 public:

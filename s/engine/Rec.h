@@ -1,4 +1,4 @@
-// A record's header: 4 bytes in front of the data that the caller holds. In a free record they
+// A record's header: 4 bytes before the data that the caller holds. In a free record they
 // chain the free list, in a used one they lead back to the bucket. A record has no alignment
 // beyond what its size gives it, so the header is declared in bytes, low byte first everywhere.
 // Test: tests/bucketmgr_test.cpp, tests/model_test.cpp.

@@ -15,7 +15,7 @@ inline constexpr std::uint32_t maxRequest = 0x3FFFFFFF;
 inline constexpr std::uint32_t maxBucketSize = 65535;
 /// The largest data alignment, a setting of 16 bits.
 inline constexpr std::uint32_t maxDataAlignment = 65535;
-/// The bookkeeping in front of each record's data.
+/// The bookkeeping before each record's data.
 inline constexpr std::uint32_t recHeaderSize = 4;
 
 static_assert(std::uint64_t{maxRequest} + maxDataAlignment + recHeaderSize <= UINT32_MAX,
@@ -46,16 +46,16 @@ constexpr RecSizeRange Normalise(std::uint32_t minSetting, std::uint32_t maxSett
 }
 
 /// The index of the class that serves `dataSize` bytes, a multiple of `alignment`. Sizes below the
-/// smallest record are lifted to it and share index 0.
+/// smallest record are clamped up to it and share index 0.
 constexpr std::uint32_t RecSizeIndex(std::uint32_t dataSize, std::uint32_t minRecSize,
                                      std::uint32_t alignment) {
   const std::uint32_t recSize = dataSize + recHeaderSize;
   return recSize < minRecSize ? 0 : (recSize - minRecSize) / alignment;
 }
 
-/// The data size that the class at index 0 must hold: the largest that is lifted to it and still
-/// fits in a record of the pool.
-/// REQUIRES: a record of `alignment` data bytes fits in `maxRecSize` and has the index 0.
+/// The data size that the class at index 0 must hold: the largest that is clamped up to it and
+/// still fits in a record of the pool. REQUIRES: a record of `alignment` data bytes fits in
+/// `maxRecSize` and has the index 0.
 constexpr std::uint32_t LargestAtIndex0(std::uint32_t minRecSize, std::uint32_t maxRecSize,
                                         std::uint32_t alignment) {
   std::uint32_t dataSize = minRecSize;

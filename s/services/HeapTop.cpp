@@ -33,7 +33,7 @@ bool IsGlibcs() {
 #endif
 }
 
-// The compiler would drop a block that nobody uses.
+// The compiler would drop an unused block.
 void* Block(std::size_t size) {
   void* const block = std::malloc(size);
   KeepStores(block);

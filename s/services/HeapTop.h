@@ -1,7 +1,7 @@
-// What the library asks of glibc's heap. Emptied buckets lie at the heap's top, where glibc gives
-// them back to the system one by one: a call and a page to fill anew for each. On another heap, and
-// beside a memory-checking tool, nothing here does anything.
-// Test: tests/process_test.py.
+// What the library asks of glibc's heap. Emptied buckets lie at the heap's top, where glibc
+// returns them to the system one by one: a system call and a page to zero again for each. On
+// another heap, and beside a memory-checking tool, nothing here does anything. Test:
+// tests/process_test.py.
 #ifndef VOK_MEMPOOL_HEAPTOP_H
 #define VOK_MEMPOOL_HEAPTOP_H
 
@@ -13,8 +13,8 @@ namespace VOK::MemPool::HeapTop {
 /// 4-byte ones, unless the program has set its threshold. Counts once in the process.
 void KeepSlack();
 
-/// While it lives, a block stands above what is released, so that the heap gives all of it back to
-/// the system in one call. Does nothing where no memory is left, and for a few bytes.
+/// While it lives, a block lies above what is released, so that the heap returns all of it to the
+/// system in one call. Does nothing where no memory is left, and for a few bytes.
 class Plug {
 public:
   explicit Plug(std::size_t bytesReleased);

@@ -1,6 +1,6 @@
 // The library's start and end: all its load-time objects, in their order, in the one unit that has
-// an initialiser. A client runs behind them, since a library is initialised before its users;
-// nothing else secures that the registry and the settings stand before the first Mgr.
+// an initialiser. A client runs after them, since a library is initialised before its users;
+// nothing else ensures that the registry and the settings exist before the first Mgr.
 // Test: tests/process_test.py, scripts/check-library.
 #include "services/MgrRegistry.h"
 #include "services/Observers.h"

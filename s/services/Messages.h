@@ -1,5 +1,5 @@
-// The message lines of the library, one function a severity. Each is told the line of the statement
-// that reports, and what the severity stands for happens here: an ERROR ends the process.
+// The message lines of the library, one function per severity. Each gets the line of the statement
+// that reports, and what the severity means happens here: an ERROR ends the process.
 // Test: tests/process_test.py.
 #ifndef VOK_MEMPOOL_MESSAGES_H
 #define VOK_MEMPOOL_MESSAGES_H

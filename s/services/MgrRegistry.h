@@ -1,5 +1,5 @@
-// The process-wide ordered map from a pool's name to the pool. It owns no pool. It stands on no
-// path of a request: only making, destroying and listing pools touch it.
+// The process-wide ordered map from a pool's name to the pool. It owns no pool. It is on no
+// path of a request: only the construction, destruction and listing of pools touch it.
 // Test: tests/registry_test.cpp.
 #ifndef VOK_MEMPOOL_MGRREGISTRY_H
 #define VOK_MEMPOOL_MGRREGISTRY_H

@@ -1,12 +1,11 @@
-// What each checker is told, in its own words. None is a dependency: memcheck is reached by a
-// sequence of instructions that means nothing outside of it, the others by names that stay null
-// where nobody defines them.
-// Test: tests/process_test.py.
+// What each memory-checking tool is told, in its own terms. None is a dependency: memcheck is
+// reached by a sequence of instructions that means nothing outside of it, the others by names that
+// stay null where no tool defines them. Test: tests/process_test.py.
 #include "services/Observers.h"
 
 #include <atomic>
 
-// Named by what they mean here; what the linker looks for stands beside.
+// Named by what they mean here; what the linker looks for is beside it.
 #ifdef _WIN32
 constexpr void (*VokAsanPoison)(const volatile void*, std::size_t) = nullptr;
 constexpr void (*VokAsanUnpoison)(const volatile void*, std::size_t) = nullptr;
@@ -40,7 +39,7 @@ enum Request : std::uintptr_t {
   MakeDefined = 0x4D430002,
 };
 
-/// Bytes in front of a record and behind it that are still told as its own: the next header.
+/// Bytes before a record and after it that are reported as its own: the next header.
 constexpr std::uintptr_t redZone = 4;
 
 bool isThere = false;
@@ -114,7 +113,7 @@ void Gone(void* p) {
 void Begin() {
   Memcheck::isThere = Memcheck::Look();
   if (Memcheck::isThere || AddressSanitizer::IsThere() || Heaptrack::IsThere())
-    watching |= watchingChecker;
+    watching |= watchingTool;
 }
 
 bool IsTracing() {

@@ -1,5 +1,5 @@
-// The checkers that may watch a process: memcheck, the address sanitizer, heaptrack. One library
-// serves all of them without a rebuild: it looks at load which are there, and tells them of each
+// The memory-checking tools of a process: memcheck, the address sanitizer, heaptrack. One library
+// serves all of them without a rebuild: it looks at load which are there, and reports to them each
 // block and record. Trace shares a byte with them, all that the fast path of a request tests.
 // Test: tests/process_test.py.
 #ifndef VOK_MEMPOOL_OBSERVERS_H
@@ -12,36 +12,36 @@
 
 namespace VOK::MemPool::Observers {
 
-/// Why a request leaves the fast path, bit by bit: trace is on, a checker is there. The first bit
-/// is the trace switch itself: a copy of it could disagree when two threads set it at once. The
-/// second one never changes after the load.
+/// Why a request leaves the fast path, bit by bit: trace is on, a memory-checking tool is there.
+/// The first bit is the trace switch itself: a copy of it could disagree when two threads set it at
+/// once. The second one never changes after the load.
 extern VOK_HIDDEN std::uint8_t watching;
 inline constexpr std::uint8_t watchingTrace = 1;
-inline constexpr std::uint8_t watchingChecker = 2;
+inline constexpr std::uint8_t watchingTool = 2;
 
 VOK_ALWAYS_INLINE bool Watching() { return watching != 0; }
 
-/// Whether a checker is there.
-inline bool Present() { return (watching & watchingChecker) != 0; }
+/// Whether a memory-checking tool is there.
+inline bool Present() { return (watching & watchingTool) != 0; }
 
 /// The trace switch, which any thread may read and set at any time. A request that runs at the same
 /// time reads the byte without synchronisation and takes either value.
 bool IsTracing();
 void SetTracing(bool on);
 
-/// Looks for the checkers. Called once, while the library loads.
+/// Looks for the tools. Called once, while the library loads.
 void Begin();
 
-// Each of these tells the checkers that are there, and does nothing if there are none.
+// Each of these reports to the tools that are there, and does nothing if there are none.
 
-/// A block of the heap serves as bucket or ExtRec: nothing in it is the caller's yet, except what
+/// A block of the heap serves as bucket or ExtRec: all of it is inaccessible, except what
 /// leads a leak checker on to the next block, its first two pointers.
 void BlockMade(void* block, std::size_t size);
 
 /// The block returns to the heap next and must bear no mark: its links are still read on the way.
 void BlockGone(void* block, std::size_t size);
 
-/// A record that nobody holds: its data must not be touched.
+/// A free record: its data is poisoned.
 void Vacant(const void* p, std::size_t capacity);
 
 /// The caller holds `size` bytes of the record from now on, but not the rest of its capacity.
@@ -51,7 +51,7 @@ void RecordMade(const void* block, void* p, std::size_t size, std::size_t capaci
 void RecordGone(const void* block, void* p, std::size_t capacity);
 
 /// While it lives, memcheck judges nothing that this thread does: for the library's own accesses to
-/// headers, which are marked as nobody's. It lives for no call on the heap of a disabled pool.
+/// headers, which are inaccessible. It lives for no call on the heap of a disabled pool.
 class Quiet {
 public:
   Quiet() : quiet(Present()) {

@@ -35,7 +35,7 @@ char* Group(std::string_view digits, const std::locale& locale, char* to) {
 } // namespace
 
 // The width is reset only where one is set: two threads may write lines at once, and a stream that
-// nobody changes is safe to read.
+// no thread changes is safe to read.
 OutputLine::OutputLine(std::ostream& stream_)
     : stream(stream_), flags(stream_.flags()), os(stream_.rdbuf()) {
   os.setstate(stream.rdstate());
@@ -85,7 +85,7 @@ OutputLine& OutputLine::Width(std::streamsize width_) {
   return *this;
 }
 
-// The fill goes behind a field under `left`, behind its prefix under `internal`, else in front.
+// The fill follows a field under `left`, its prefix under `internal`, and precedes it otherwise.
 void OutputLine::Field(std::string_view field, std::size_t prefix) {
   const std::ios::fmtflags adjust = flags & std::ios::adjustfield;
   const std::size_t ahead = adjust == std::ios::left       ? field.size()
