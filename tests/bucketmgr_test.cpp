@@ -94,8 +94,10 @@ TEST_F(Pools, BucketAtNull) {
   p[-4] = static_cast<std::uint8_t>(offset % 256);
   p[-3] = static_cast<std::uint8_t>(offset / 256);
   p[-2] = RecType::Used;
-  Mgr& pool = Make("");
+  Mgr& pool = Make("trace=1");
+  testing::internal::CaptureStdout();
   EXPECT_TRUE(pool.GetSize(p) == 0 && !pool.Contains(p) && !pool.Free(p));
+  EXPECT_TRUE(testing::internal::GetCapturedStdout().ends_with(":10008:\n"));
   munmap(page, 4096);
 }
 #endif

@@ -96,11 +96,13 @@ memcheck ON=1 : pool a; alloc 10; alloc 10; free 1; write 0 -> status 9
     ~ Invalid write of size 1\n.*::Write\(
 memcheck ON=1 : pool a; alloc 10; clear; write 0 -> status 9
     ~ 0 bytes inside a block of size 10 free.d ~ Mgr::Clear
+memcheck ON=1 : pool a; alloc 10; reset; write 0 -> status 9 ~ Invalid write of size 1
 memcheck ON=0 : pool a; alloc 10; free 0; free 0 -> status 9 ~ Invalid free
     ~ ::Free\w*\(.*\n.*pool_child.cpp
 asan ON=1 : pool a; alloc 9; write 9 -> status 1
     ~ AddressSanitizer: (use-after-poison|unknown-crash) ~ in Write
 asan ON=1 : pool a; alloc 10; alloc 10; free 1; write 0 -> status 1 ~ use-after-poison ~ in Write
+asan ON=1 : pool a; alloc 10; reset; write 0 -> status 1 ~ use-after-poison ~ in Write
 asan ON=1 : pool a; alloc 10; clear; write 0 -> status 1 ~ heap-use-after-free ~ freed by
 memcheck ON=1 KEEP_EMPTY_BUCKETS=1 : pool a; alloc 11; alloc 100; free 1; alloc 10; forget; alloc 5000;
     forget -> status 9 ~ (?s)^(?!(.*definitely lost){3})
@@ -113,7 +115,7 @@ heaptrack ON=1 KEEP_EMPTY_BUCKETS=1 : pool a; alloc 11; alloc 100; free 1; alloc
 memcheck|asan ON=1 : pool a; alloc 10; alloc 10; free 1; free 1; size 1; contains 1; drop
     -> freed; refused; 0; 0
 memcheck|asan ON=1 : pool a; alloc 13; alloc 5000; report; free 0; free 1; alloc 996; clear;
-    alloc 8; drop -> ~ ^$
+    alloc 8; reset; alloc 8; drop -> ~ ^$
 
 # How often the heap returns memory: never within the slack, once for a Clear or a pool beyond it.
 strace ON=1 : pool a; build 100; clear; build 1000; clear; build 10000; drop -> ~ ^0 shrinks

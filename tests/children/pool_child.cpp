@@ -105,6 +105,7 @@ constexpr struct {
     {"drop", [](State& s) { delete &s.Pool(), s.pools.pop_back(); }},
     {"build", Build},
     {"clear", [](State& s) { s.Pool().Clear(); }},
+    {"reset", [](State& s) { std::cout << s.Pool().Reset() << '\n'; }},
     {"report", [](State&) { DbgDetailed(); }},
     {"alloc", Alloc},
     {"free", [](State& s) { std::cout << (s.Pool().Free(s.Block()) ? "freed\n" : "refused\n"); }},
