@@ -17,8 +17,9 @@ namespace {
 
 // What a new-handler does, one step after the other: a call on the whole pool, or a request of
 // that many bytes. Each plan leaves Groups and buckets other than those that Alloc saw.
-enum Step { clear = -2, freeAll = -1 };
-const std::vector<int> plans[] = {{clear}, {freeAll}, {4, 8, 100, 4, 4}, {clear, 8, 4}};
+enum Step { reset = -3, clear = -2, freeAll = -1 };
+const std::vector<int> plans[] = {{clear},           {freeAll},     {reset},
+                                  {4, 8, 100, 4, 4}, {clear, 8, 4}, {reset, 8, 4}};
 
 struct Reentered {
   Mgr mgr;
@@ -30,9 +31,10 @@ struct Reentered {
     const ArenaHeap::Use real(false);
     if (p != nullptr) return held.push_back(p);
     if (step == clear) mgr.Clear();
+    EXPECT_TRUE(step != reset || mgr.Reset());
     for (void* const h : held)
-      EXPECT_TRUE(step == clear || (mgr.Contains(h) && mgr.GetSize(h) >= 4 &&
-                                    *static_cast<std::uint8_t*>(h) == 0xA5 && mgr.Free(h)));
+      EXPECT_TRUE(step != freeAll || (mgr.Contains(h) && mgr.GetSize(h) >= 4 &&
+                                      *static_cast<std::uint8_t*>(h) == 0xA5 && mgr.Free(h)));
     held.clear();
   }
 };
@@ -68,7 +70,7 @@ TEST(NewHandler, MayUseThePoolThatIsOutOfMemory) {
           std::set_new_handler(nullptr);
           heap.FailAt(0);
           EXPECT_TRUE(IsValid(*pool->mgr.GetBucketMgr()));
-          pool->Do(freeAll);
+          pool->Do(steps[0] == reset ? clear : freeAll);
           EXPECT_EQ(pool->mgr.GetBucketMgr()->GetNumBuckets(), 0u);
           EXPECT_EQ(heap.faults, std::vector<std::string>());
         }

@@ -21,7 +21,7 @@
 namespace VOK::MemPool {
 
 BucketMgr::BucketMgr(Mgr* mgr_, const std::string& name_)
-    : name(name_), mgr(mgr_), groups(nullptr), extRecs(nullptr), numExtRecs(0),
+    : name(name_), mgr(mgr_), groups(nullptr), extRecs(nullptr), numGroups(0), numExtRecs(0),
       bucketSize(std::min(Settings::bucketSize, maxBucketSize)),
       dataAlignment(std::max<std::uint32_t>(Settings::dataAlignment, 1)),
       keepEmptyBuckets(Settings::keepEmptyBuckets) {
@@ -134,7 +134,7 @@ bool BucketMgr::Contains(const void* p) const {
 void BucketMgr::Clear() noexcept {
   const Observers::Quiet quiet;
   ReportAllGone();
-  const HeapTop::Plug plug(std::size_t{GetNumBuckets()} * bucketSize);
+  const HeapTop::Plug plug(std::uint64_t{GetNumBuckets()} * bucketSize);
   ReleaseExtRecs();
   ForEachGroup(*this, [this](Group& group, std::uint32_t i) {
     group.Clear();

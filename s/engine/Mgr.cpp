@@ -22,6 +22,8 @@ namespace {
 
 } // namespace
 
+Mgr* MgrRegistry::HandleOf(const BucketMgr* pool) { return pool->mgr; }
+
 Mgr::Mgr() : Mgr(nullptr) {}
 
 Mgr::Mgr(const char* name) : bucketMgr(nullptr) {

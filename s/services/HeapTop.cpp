@@ -5,10 +5,12 @@
 #include "base/KeepStores.h"
 #include "services/Observers.h"
 
+#include <cerrno>
 #include <cstdlib>
 
 #ifdef __GLIBC__
-extern "C" void* VokGlibcMalloc(std::size_t) __asm__("__libc_malloc") __attribute__((weak));
+#include <dlfcn.h>
+#include <gnu/libc-version.h>
 #endif
 
 namespace VOK::MemPool::HeapTop {
@@ -19,24 +21,35 @@ namespace {
 /// lets the top grow to twice that. This is near the largest block for which it does.
 constexpr std::size_t slackBlock = sizeof(void*) == 8 ? 31u << 20 : 448u << 10;
 
-/// What glibc lets the top grow to by itself, and a block that it neither maps nor finds in a hole
-/// as a bucket leaves one.
-constexpr std::size_t trimThreshold = 128u << 10;
+/// What glibc lets the top grow to by itself.
+constexpr std::uint64_t trimThreshold = 128u << 10;
+
+/// Below the size that glibc maps by default, and above the holes that single buckets leave.
 constexpr std::size_t plugBlock = 96u << 10;
 
-/// A program may bring a malloc of its own.
+bool isGlibcs = false; ///< the heap is glibc's; settled by the first KeepSlack
+
+// Other allocators export glibc's names for malloc, too. So the question is in which library the
+// program's malloc lies.
 bool IsGlibcs() {
 #ifdef __GLIBC__
-  return &std::malloc == &VokGlibcMalloc && !Observers::Present();
+  Dl_info heap{};
+  Dl_info glibc{};
+  return !Observers::ReplaceHeap() &&
+         dladdr(reinterpret_cast<const void*>(&std::malloc), &heap) != 0 &&
+         dladdr(reinterpret_cast<const void*>(&gnu_get_libc_version), &glibc) != 0 &&
+         heap.dli_fbase == glibc.dli_fbase;
 #else
   return false;
 #endif
 }
 
-// The compiler would drop an unused block.
+// The compiler would drop an unused block. A failure is none of the caller's.
 void* Block(std::size_t size) {
+  const int error = errno;
   void* const block = std::malloc(size);
   KeepStores(block);
+  errno = error;
   return block;
 }
 
@@ -44,13 +57,14 @@ void* Block(std::size_t size) {
 
 void KeepSlack() {
   static bool isAsked = false;
-  if (isAsked || !IsGlibcs()) return;
+  if (isAsked) return;
   isAsked = true;
-  std::free(Block(slackBlock));
+  isGlibcs = IsGlibcs();
+  if (isGlibcs) std::free(Block(slackBlock));
 }
 
-Plug::Plug(std::size_t bytesReleased)
-    : block(bytesReleased > trimThreshold && IsGlibcs() ? Block(plugBlock) : nullptr) {}
+Plug::Plug(std::uint64_t bytesReleased)
+    : block(isGlibcs && bytesReleased > trimThreshold ? Block(plugBlock) : nullptr) {}
 
 Plug::~Plug() { std::free(block); }
 

@@ -1,23 +1,24 @@
-// What the library asks of glibc's heap. Emptied buckets lie at the heap's top, where glibc
-// returns them to the system one by one: a system call and a page to zero again for each. On
-// another heap, and beside a memory-checking tool, nothing here does anything. Test:
-// tests/process_test.py.
+// What the library asks of glibc's heap. Emptied buckets lie at the heap's top, where glibc returns
+// them to the system one by one: a system call for each, and a page to zero again. On another heap,
+// and where a tool has replaced it, nothing here does anything.
+// Test: tests/process_test.py.
 #ifndef VOK_MEMPOOL_HEAPTOP_H
 #define VOK_MEMPOOL_HEAPTOP_H
 
-#include <cstddef>
+#include <cstdint>
 
 namespace VOK::MemPool::HeapTop {
 
 /// Lets the heap keep more free bytes at its top, 62 MiB with 8-byte pointers and 896 KiB with
-/// 4-byte ones, unless the program has set its threshold. Counts once in the process.
+/// 4-byte ones, unless the program has set its threshold. Only the first call has an effect.
 void KeepSlack();
 
-/// While it lives, a block lies above what is released, so that the heap returns all of it to the
-/// system in one call. Does nothing where no memory is left, and for a few bytes.
+/// Asks for a block above the buckets that are released while it lives, so that the heap returns
+/// all of them to the system in one call. Does nothing below 128 KiB of buckets, before the first
+/// KeepSlack, and where no memory is left.
 class Plug {
 public:
-  explicit Plug(std::size_t bytesReleased);
+  explicit Plug(std::uint64_t bytesReleased);
   ~Plug();
   Plug(const Plug&) = delete;
   Plug& operator=(const Plug&) = delete;

@@ -11,6 +11,7 @@
 
 namespace VOK::MemPool {
 
+class Mgr;
 struct BucketMgr;
 
 namespace MgrRegistry {
@@ -34,6 +35,9 @@ void Enter(const std::string& name, BucketMgr* pool);
 
 /// Removes the entry of that name, if there is one.
 void Remove(const std::string& name) noexcept;
+
+/// The handle of a pool. The engine, which knows a pool's inside, defines it.
+Mgr* HandleOf(const BucketMgr* pool);
 
 /// A name for a pool that was given none. A number once given never comes again.
 std::string NextAutomaticName();

@@ -30,6 +30,7 @@ namespace {
 namespace Memcheck {
 
 enum Request : std::uintptr_t {
+  RunningOnValgrind = 0x1001,
   CreatePool = 0x1303,
   DestroyPool = 0x1304,
   PoolAlloc = 0x1305,
@@ -115,6 +116,8 @@ void Begin() {
   if (Memcheck::isThere || AddressSanitizer::IsThere() || Heaptrack::IsThere())
     watching |= watchingTool;
 }
+
+bool ReplaceHeap() { return Present() || Memcheck::Ask(Memcheck::RunningOnValgrind, nullptr) != 0; }
 
 bool IsTracing() {
   return (std::atomic_ref<std::uint8_t>(watching).load(std::memory_order_relaxed) &

@@ -29,19 +29,22 @@ inline bool Present() { return (watching & watchingTool) != 0; }
 bool IsTracing();
 void SetTracing(bool on);
 
+/// Whether a tool has replaced the heap: one of those above, or another one of valgrind.
+bool ReplaceHeap();
+
 /// Looks for the tools. Called once, while the library loads.
 void Begin();
 
 // Each of these reports to the tools that are there, and does nothing if there are none.
 
-/// A block of the heap serves as bucket or ExtRec: all of it is inaccessible, except what
-/// leads a leak checker on to the next block, its first two pointers.
+/// A block of the heap serves as bucket or ExtRec. To memcheck all of it is inaccessible, except
+/// what leads its leak check on to the next block, the first two pointers.
 void BlockMade(void* block, std::size_t size);
 
 /// The block returns to the heap next and must bear no mark: its links are still read on the way.
 void BlockGone(void* block, std::size_t size);
 
-/// A free record: its data is poisoned.
+/// A free record: to the address sanitizer its data is poisoned.
 void Vacant(const void* p, std::size_t capacity);
 
 /// The caller holds `size` bytes of the record from now on, but not the rest of its capacity.

@@ -2,26 +2,25 @@
 // Test: tests/registry_test.cpp.
 #include "MemPool"
 
-#include "engine/BucketMgr.h"
 #include "services/MgrRegistry.h"
 
 namespace VOK::MemPool {
 
 Mgr* GetMgr(const char* name) {
-  BucketMgr* const pool = MgrRegistry::Find(name != nullptr ? name : "");
-  return pool != nullptr ? pool->mgr : nullptr;
+  const BucketMgr* const pool = MgrRegistry::Find(name != nullptr ? name : "");
+  return pool != nullptr ? MgrRegistry::HandleOf(pool) : nullptr;
 }
 
 void GetMgrs(vector<Mgr*>& mgrs) {
   mgrs.Reserve(GetNumMgrs());
   for (const auto& [name, pool] : MgrRegistry::Entries())
-    mgrs.Append(pool->mgr);
+    mgrs.Append(MgrRegistry::HandleOf(pool));
 }
 
 void GetMgrs(std::vector<Mgr*>& mgrs) {
   mgrs.reserve(GetNumMgrs());
   for (const auto& [name, pool] : MgrRegistry::Entries())
-    mgrs.push_back(pool->mgr);
+    mgrs.push_back(MgrRegistry::HandleOf(pool));
 }
 
 unsigned GetNumMgrs() { return static_cast<unsigned>(MgrRegistry::Entries().size()); }
