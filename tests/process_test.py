@@ -120,15 +120,20 @@ memcheck|asan ON=1 : pool a; alloc 13; alloc 5000; report; free 0; free 1; alloc
 # How often the heap returns memory: never within the slack, once for a Clear or a pool beyond it.
 strace ON=1 : pool a; build 100; clear; build 1000; clear; build 10000; drop -> ~ ^0 shrinks
 strace ON=1 : pool a; build 20000; clear; build 20000; drop -> ~ ^2 shrinks
+# The slack is asked for once, and not of another heap than glibc's.
+strace ON=1 : pool a; pool b -> ~ shrinks, 1 maps
+mimalloc ON=1 : pool a; pool b -> ~ shrinks, 0 maps
 trimming ON=1 : pool a; build 100; clear; build 1000; clear; build 10000; drop -> ~ ^3 shrinks
 """
-STRACE = "strace -e trace=brk -o calls ../pool_child {} && awk '/^brk/ {{ n += $NF \"\" < last; " \
-         "last = $NF }} END {{ print n, \"shrinks\" }}' calls >&2"
+STRACE = "strace -e trace=brk,mmap -o calls {}../pool_child {{}} && awk '/^brk/ {{{{ n += $NF \"\" " \
+         "< last; last = $NF }}}} /mmap.NULL, 325/ {{{{ ++m }}}} END {{{{ print n + 0, \"shrinks,\", " \
+         "m + 0, \"maps\" }}}}' calls >&2"
 COMMANDS = {
     "memcheck": "exec valgrind -q --leak-check=full --error-exitcode=9 ../pool_child {}",
     "asan": "exec ../pool_child_asan {}",
-    "strace": STRACE,
-    "trimming": "export MALLOC_TRIM_THRESHOLD_=131072; " + STRACE,
+    "strace": STRACE.format(""),
+    "trimming": STRACE.format("-E MALLOC_TRIM_THRESHOLD_=131072 "),
+    "mimalloc": STRACE.format("-E LD_PRELOAD=libmimalloc.so.2 "),
     "heaptrack": "heaptrack -o trace ../pool_child {} >/dev/null 2>&1 && "
                  "heaptrack_print -l 1 -a 0 -p 0 -T 0 trace.* >&2 2>/dev/null",
 }

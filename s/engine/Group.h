@@ -44,7 +44,7 @@ struct Group {
   /// Releases all buckets, in whatever state they are.
   void Clear() noexcept;
 
-  /// Makes every bucket as newly made, and the second list equal to the first.
+  /// Gives every bucket the free list of a new one, and makes the second list equal to the first.
   void Reset() noexcept;
 
   /// Puts `b` at the head of the second list. Its `prev2` is null already: a bucket only ever
