@@ -97,23 +97,27 @@ memcheck ON=1 : pool a; alloc 10; alloc 10; free 1; write 0 -> status 9
 memcheck ON=1 : pool a; alloc 10; clear; write 0 -> status 9
     ~ 0 bytes inside a block of size 10 free.d ~ Mgr::Clear
 memcheck ON=1 : pool a; alloc 10; reset; write 0 -> status 9 ~ Invalid write of size 1
+memcheck ON=1 : pool a; alloc 10; write 20 -> status 9 ~ Invalid write of size 1
 memcheck ON=0 : pool a; alloc 10; free 0; free 0 -> status 9 ~ Invalid free
     ~ ::Free\w*\(.*\n.*pool_child.cpp
 asan ON=1 : pool a; alloc 9; write 9 -> status 1
     ~ AddressSanitizer: (use-after-poison|unknown-crash) ~ in Write
 asan ON=1 : pool a; alloc 10; alloc 10; free 1; write 0 -> status 1 ~ use-after-poison ~ in Write
+asan ON=1 : pool a; alloc 10; write 20 -> status 1 ~ use-after-poison ~ in Write
 asan ON=1 : pool a; alloc 10; reset; write 0 -> status 1 ~ use-after-poison ~ in Write
 asan ON=1 : pool a; alloc 10; clear; write 0 -> status 1 ~ heap-use-after-free ~ freed by
 memcheck ON=1 KEEP_EMPTY_BUCKETS=1 : pool a; alloc 11; alloc 100; free 1; alloc 10; forget; alloc 5000;
     forget -> status 9 ~ (?s)^(?!(.*definitely lost){3})
     ~ 10 bytes in 1 blocks are definitely lost ~ 5,000 bytes in 1 blocks are definitely lost
     ~ ::Alloc\(.*pool_child.cpp
-heaptrack ON=1 KEEP_EMPTY_BUCKETS=1 : pool a; alloc 11; alloc 100; free 1; alloc 10; forget
+heaptrack ON=1 KEEP_EMPTY_BUCKETS=1 : pool a; alloc 5000; reset; alloc 11; alloc 5000; alloc 100;
+    free 2; free 3; alloc 10; forget
     -> ~ (?m)^21B leaked over ~ (?s)^(?!.*Bucket::Create)
 
 # What neither of two may find. A second Free is refused.
 memcheck|asan ON=1 : pool a; alloc 10; alloc 10; free 1; free 1; size 1; contains 1; drop
     -> freed; refused; 0; 0
+memcheck|asan ON=1 : pool a; alloc 12; alloc 12; free 0; write 0; alloc 12; write 16; drop -> freed
 memcheck|asan ON=1 : pool a; alloc 13; alloc 5000; report; free 0; free 1; alloc 996; clear;
     alloc 8; alloc 5000; reset; alloc 5000; drop -> ~ ^$
 
