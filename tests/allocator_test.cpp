@@ -30,7 +30,7 @@ void ExpectEmpty(const Mgr& pool) {
 /// Each pool must be empty in the end.
 template <class Use>
 void ForEachSetting(Use use) {
-  const KeepSettings settings;
+  const KeepSettings settings{};
   for (const std::string alignment : {"1", "2", "4", "6", "8", "12", "16"})
     for (const char* const more : {" on=0", " on=1 max=64", " max=1000", " max=4006"}) {
       Set("align=" + alignment + more);
@@ -68,7 +68,7 @@ TEST(Resource, CostsWhatIsDocumented) {
       {1000, 8, 1008, 1008}, {2000, 16, 2016, 2016},   {997, 1, 997, 997},
       {2000, 4, 2000, 2000}, {4096, 4096, 8192, 8192}, {8, 1 << 24, 1 << 25, 1 << 25},
   };
-  const KeepSettings settings;
+  const KeepSettings settings{};
   Set("on=1");
   Mgr pool;
   Resource resource(pool);

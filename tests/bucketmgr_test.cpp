@@ -27,7 +27,7 @@ namespace {
 class Pools : public testing::Test {
 protected:
   ArenaHeap heap;
-  const KeepSettings settings;
+  const KeepSettings settings{};
   const Observers::Quiet looking; // into headers
   std::vector<std::unique_ptr<Mgr>> pools;
 

@@ -187,7 +187,7 @@ private:
   ArenaHeap& heap;
   const std::function<int()> next;
   Log log{heap};
-  const KeepSettings settings;
+  const KeepSettings settings{};
   const VOK::MemPool::Observers::Quiet looking;
   Pool pools[4];
 };
