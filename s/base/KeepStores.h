@@ -1,5 +1,5 @@
-// Stores to an object whose life or memory ends next, and a block of memory that nobody uses. The
-// compiler takes them for dead and drops them; who looks later must find them done all the same.
+// Stores to an object whose life or memory ends next. The compiler takes them for dead and drops
+// them; a stale pointer to the object must find them done all the same.
 // Test: tests/bucketmgr_test.cpp, tests/reentry_test.cpp.
 #ifndef VOK_MEMPOOL_KEEPSTORES_H
 #define VOK_MEMPOOL_KEEPSTORES_H

@@ -2,7 +2,6 @@
 // Test: tests/process_test.py.
 #include "services/HeapTop.h"
 
-#include "base/KeepStores.h"
 #include "services/Observers.h"
 
 #include <cerrno>
@@ -47,8 +46,8 @@ bool IsGlibcs() {
 // The compiler would drop an unused block. A failure is none of the caller's.
 void* Block(std::size_t size) {
   const int error = errno;
-  void* const block = std::malloc(size);
-  KeepStores(block);
+  void* block = std::malloc(size);
+  __asm__ volatile("" : "+r"(block));
   errno = error;
   return block;
 }
