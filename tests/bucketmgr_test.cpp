@@ -159,9 +159,9 @@ TEST_F(Pools, DisabledBlocksOfAnySize) {
 
 TEST_F(Pools, IsValidSeesEachDamage) {
   Mgr& mgr = Make("bucket=26 max=16 keep=1");
-  std::vector<std::uint8_t*> p;
-  for (int i = 0; i < 9; ++i)
-    p.push_back(Alloc(mgr, 4));
+  std::vector<std::uint8_t*> p(9);
+  for (std::uint8_t*& data : p)
+    data = Alloc(mgr, 4);
   std::memset(p[4], 0, 4); // reads as the header of a free record, and is none
   for (const unsigned i : {4u, 6u, 7u, 8u})
     mgr.Free(p[i]);

@@ -122,7 +122,8 @@ TEST(Report, FormsAFractionAsTheStreamDoes) {
   pool.Alloc(4);
   for (const int mode : {FE_TONEAREST, FE_UPWARD}) {
     std::fesetround(mode);
-    std::ostringstream report, expected;
+    std::ostringstream report;
+    std::ostringstream expected;
     pool.GetBucketMgr()->Dbg(report, 0, false, false, false);
     const volatile double hundred = 100;
     expected << std::fixed << std::setprecision(3) << hundred / 3 << "% ";

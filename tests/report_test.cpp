@@ -153,7 +153,7 @@ TEST_F(Reports, AllPools) {
   BucketMgr* const own = disabled.GetBucketMgr();
   disabled = emptied;
   ExpectGolden("all-detailed", Report([] { DbgDetailed(); }));
-  std::memcpy(static_cast<void*>(&disabled), &own, sizeof own);
+  std::memcpy(static_cast<void*>(&disabled), &own, sizeof(Mgr));
 }
 
 // The state under which a report starts is part of its text, and some of it stays behind.
@@ -234,7 +234,8 @@ TEST_F(Reports, DamagedBucket) {
     damage(text);
     std::ostringstream os;
     const std::string warnings = Report([&] { Write(pool, os); });
-    changes += "== " + text + ", " + Changes(before.str(), os.str()) + warnings;
+    changes.append("== ").append(text).append(", ");
+    changes.append(Changes(before.str(), os.str())).append(warnings);
   }
   ExpectGolden("damages", changes);
 

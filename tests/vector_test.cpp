@@ -23,7 +23,8 @@ TEST(Vector, GrowsByItsRules) {
     std::vector<std::uint32_t> expected;
     // Appends a new number or, of the block that goes, an own one; or reserves as many.
     for (const char step : std::string("0nnnno8;3nnnnnnn")) {
-      const std::uint32_t number = step == 'o' ? v[1] : 100 + v.count, capacity = v.capacity;
+      const std::uint32_t number = step == 'o' ? v[1] : 100 + v.count;
+      const std::uint32_t capacity = v.capacity;
       const auto act = [&] {
         const ArenaHeap::Use use;
         step == 'n'   ? v.Append(number)

@@ -7,9 +7,7 @@
 #include <cstdint>
 #include <new>
 
-namespace VOK::MemPool {
-
-namespace MgrRegistry {
+namespace VOK::MemPool::MgrRegistry {
 
 namespace {
 
@@ -43,6 +41,4 @@ std::string NextAutomaticName() {
   return "__VOK_MEMPOOL_" + std::string(width - std::min(width, number.size()), '0') + number;
 }
 
-} // namespace MgrRegistry
-
-} // namespace VOK::MemPool
+} // namespace VOK::MemPool::MgrRegistry

@@ -5,9 +5,7 @@
 #include "base/PointerText.h"
 #include "services/OutputLine.h"
 
-namespace VOK::MemPool {
-
-namespace Trace {
+namespace VOK::MemPool::Trace {
 
 namespace {
 
@@ -29,6 +27,4 @@ void Freed(const BucketMgr* pool, const void* p) {
   (Begin(OutputLine(), "f:", pool) << ":" << BarePtrText(p).text << ":").End();
 }
 
-} // namespace Trace
-
-} // namespace VOK::MemPool
+} // namespace VOK::MemPool::Trace

@@ -57,7 +57,7 @@ public:
   static void Open(const void* from, std::size_t size);
 
   void* Take(std::size_t size, Form form);
-  void GiveBack(void* p, Form form, const std::size_t* size);
+  void GiveBack(void* block, Form form, const std::size_t* size);
 
 private:
   struct Block {

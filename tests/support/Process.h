@@ -40,7 +40,7 @@ inline std::locale Grouping(const char* sizes = "\1") {
     std::string do_grouping() const override { return dead ? throw 1 : sizes; }
     const char* const sizes;
   };
-  return std::locale(std::locale::classic(), new Format(sizes));
+  return {std::locale::classic(), new Format(sizes)};
 }
 
 /// While it lives, the global locale groups digits.

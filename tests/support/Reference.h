@@ -38,7 +38,7 @@ public:
 
   /// The next event, which must be one of these kinds; '|' is the line that `text` ends with.
   const ArenaHeap::Event& Next(const std::string& kinds, const std::string& text = "") {
-    Demand(at < heap.events.size() && kinds.find(heap.events[at].kind) != kinds.npos,
+    Demand(at < heap.events.size() && kinds.find(heap.events[at].kind) != std::string::npos,
            "another use of heap or output");
     expected += text;
     return heap.events[at++];
@@ -182,7 +182,7 @@ public:
     return group->recSize - 4;
   }
   /// The length of an ExtRec, 0 for anything else.
-  std::uint32_t ExtSize(std::uint8_t* p) const {
+  std::uint32_t ExtSize(const std::uint8_t* p) const {
     const auto ext = std::ranges::find(exts, p - extHeader);
     return ext == exts.end() ? 0 : static_cast<std::uint32_t>(blocks.at(*ext).size() - extHeader);
   }
