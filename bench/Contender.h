@@ -26,10 +26,9 @@
 #include "Replay.h"
 #include "Resident.h"
 
-#include <time.h>
-
 #include <cstdint>
 #include <cstdio>
+#include <ctime>
 #include <exception>
 #include <iostream>
 #include <sstream>

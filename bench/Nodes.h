@@ -28,7 +28,7 @@ public:
   explicit NodeAllocator(const NodeAllocator<U, Rival>& other) : rival(other.rival) {}
 
   T* allocate(std::size_t n) {
-    const auto size = static_cast<std::uint32_t>(n * sizeof(T));
+    const std::uint32_t size = SizeOf(n);
     if constexpr (alignof(T) <= Rival::alignment)
       return static_cast<T*>(rival->Alloc(size));
     else
@@ -36,7 +36,7 @@ public:
   }
 
   void deallocate(T* p, std::size_t n) {
-    const auto size = static_cast<std::uint32_t>(n * sizeof(T));
+    const std::uint32_t size = SizeOf(n);
     if constexpr (alignof(T) <= Rival::alignment)
       rival->Free(p, size);
     else
@@ -51,6 +51,10 @@ private:
   template <class, class>
   friend class NodeAllocator;
   static_assert(alignof(T) <= 8);
+
+  static std::uint32_t SizeOf(std::size_t n) {
+    return static_cast<std::uint32_t>(n * sizeof(T)); // NOLINT(bugprone-sizeof-expression)
+  }
 
   Rival* rival;
 };

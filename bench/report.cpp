@@ -72,9 +72,9 @@ std::vector<std::string> ReportLines(const Mgr& pool) {
 }
 
 std::vector<unsigned char*> Fill(Mgr& pool, int records) {
-  std::vector<unsigned char*> data;
-  for (int i = 0; i < records; ++i)
-    data.push_back(static_cast<unsigned char*>(pool.Alloc(24)));
+  std::vector<unsigned char*> data(static_cast<std::size_t>(records));
+  for (unsigned char*& p : data)
+    p = static_cast<unsigned char*>(pool.Alloc(24));
   std::sort(data.begin(), data.end());
   return data;
 }
@@ -88,7 +88,10 @@ void Measure(const std::string& path) {
   Fill(small, smallRecords);
   const auto lines = ReportLines(large);
 
-  std::vector<double> plain, headers, written, detailed;
+  std::vector<double> plain;
+  std::vector<double> headers;
+  std::vector<double> written;
+  std::vector<double> detailed;
   std::uint64_t used = 0;
   for (int round = 0; round < rounds; ++round) {
     plain.push_back(SecondsToFile(path, [&] { large.Dbg(); }));

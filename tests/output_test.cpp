@@ -157,6 +157,7 @@ TEST(Threads, SwitchTraceAndItsLinesTogether) {
 TEST(Threads, WriteWholeLinesWithAPoolEach) {
   Set("on=1 bucket=26 max=8 trace=1"); // three records in a bucket
   const auto work = [](Mgr& pool) {
+    const Observers::Quiet looking; // into headers
     for (int i = 0; i < 100; ++i) {
       void* const p = pool.Alloc(4);
       Bucket* const bucket = Bucket::FromData(p);

@@ -46,8 +46,8 @@ bool IsGlibcs() {
 // The compiler would drop an unused block. A failure is none of the caller's.
 void* Block(std::size_t size) {
   const int error = errno;
-  void* block = std::malloc(size);
-  __asm__ volatile("" : "+r"(block));
+  void* const block = std::malloc(size);
+  __asm__ volatile("" : : "r"(block));
   errno = error;
   return block;
 }
