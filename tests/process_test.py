@@ -133,7 +133,7 @@ STRACE = "strace -e trace=brk,mmap -o calls {}../pool_child {{}} && awk '/^brk/ 
          "< last; last = $NF }}}} /mmap.NULL, 325/ {{{{ ++m }}}} END {{{{ print n + 0, \"shrinks,\", " \
          "m + 0, \"maps\" }}}}' calls >&2"
 COMMANDS = {
-    "memcheck": "exec valgrind -q --leak-check=full --error-exitcode=9 ../pool_child {}",
+    "memcheck": "exec valgrind -q --num-callers=20 --leak-check=full --error-exitcode=9 ../pool_child {}",
     "asan": "exec ../pool_child_asan {}",
     "strace": STRACE.format(""),
     "trimming": STRACE.format("-E MALLOC_TRIM_THRESHOLD_=131072 "),
