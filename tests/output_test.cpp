@@ -13,7 +13,6 @@
 #include "services/Trace.h"
 
 #include <atomic>
-#include <cfenv>
 #include <gmock/gmock.h>
 #include <iomanip>
 #include <iostream>
@@ -110,25 +109,6 @@ TEST(OutputLine, ChangesNothingButAPendingWidth) {
     EXPECT_EQ(tiedBuffer.numFlushes, 2u);
     EXPECT_TRUE(std::cout.good() && std::cout.flags() == flags && std::cout.width() == 0 &&
                 std::cout.fill() == '*' && std::cout.getloc() == locale && tied.good());
-  }
-}
-
-// "% Used" of one record in three, also where the process rounds up.
-TEST(Report, FormsAFractionAsTheStreamDoes) {
-  ZOR_VOK_MEMPOOL_ON(true);
-  ZOR_VOK_MEMPOOL_BUCKET_SIZE(26);
-  ZOR_VOK_MEMPOOL_MAX_RECORD_SIZE(8);
-  Mgr pool;
-  pool.Alloc(4);
-  for (const int mode : {FE_TONEAREST, FE_UPWARD}) {
-    std::fesetround(mode);
-    std::ostringstream report;
-    std::ostringstream expected;
-    pool.GetBucketMgr()->Dbg(report, 0, false, false, false);
-    const volatile double hundred = 100;
-    expected << std::fixed << std::setprecision(3) << hundred / 3 << "% ";
-    std::fesetround(FE_TONEAREST);
-    EXPECT_THAT(report.str(), testing::HasSubstr(expected.str()));
   }
 }
 

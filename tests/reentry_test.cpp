@@ -1,5 +1,6 @@
 // A new-handler that uses the pool whose Alloc is out of memory.
 #include "support/ArenaHeap.h"
+#include "support/Process.h"
 
 #include "MemPool"
 #include "engine/BucketMgr.h"
@@ -44,9 +45,8 @@ const std::vector<int>* plan;
 int numRuns = 0;
 
 TEST(NewHandler, MayUseThePoolThatIsOutOfMemory) {
-  ZOR_VOK_MEMPOOL_ON(true);
-  ZOR_VOK_MEMPOOL_BUCKET_SIZE(26); // two records of 4 bytes, one of 8
-  ZOR_VOK_MEMPOOL_MAX_RECORD_SIZE(16);
+  const KeepSettings settings{};
+  Set("on=1 bucket=26 max=16"); // two records of 4 bytes, one of 8
   for (const std::vector<int>& steps : plans)
     for (const int numBefore : {0, 2, 4})
       for (const int size : {4, 8, 100})
@@ -75,9 +75,6 @@ TEST(NewHandler, MayUseThePoolThatIsOutOfMemory) {
           EXPECT_EQ(heap.faults, std::vector<std::string>());
         }
   EXPECT_GE(numRuns, 36);
-  ZOR_VOK_MEMPOOL_ON(false);
-  ZOR_VOK_MEMPOOL_BUCKET_SIZE(4010);
-  ZOR_VOK_MEMPOOL_MAX_RECORD_SIZE(1000);
 }
 
 } // namespace

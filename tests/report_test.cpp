@@ -11,6 +11,7 @@
 #include "services/Observers.h"
 
 #include <algorithm>
+#include <cfenv>
 #include <cstdlib>
 #include <cstring>
 #include <fstream>
@@ -184,6 +185,16 @@ TEST_F(Reports, StateOfTheStream) {
     }
   }
   ExpectGolden("states", changes);
+
+  // A fraction is formed as the platform's stream forms it, also where the process rounds up.
+  const volatile double hundred = 100;
+  std::ostringstream os;
+  std::ostringstream third;
+  std::fesetround(FE_UPWARD);
+  Write(*pools[0], os);
+  third << std::fixed << std::setprecision(3) << hundred / 3 << "% ";
+  std::fesetround(FE_TONEAREST);
+  EXPECT_THAT(os.str(), HasSubstr(third.str()));
 }
 
 TEST_F(Reports, DamagedBucket) {

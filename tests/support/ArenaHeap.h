@@ -29,7 +29,6 @@ public:
 
   std::vector<Event> events;       ///< all since a test emptied it
   std::vector<std::string> faults; ///< wrong forms, wrong sizes, broken guards, strays
-  unsigned numCalls = 0;           ///< allocations asked for, failed ones included
 
   ArenaHeap();
   ~ArenaHeap();

@@ -111,27 +111,16 @@ def test_commands():
     same(is_like(terminal, "\r0 MB read\x1b[K\r\x1b[K1 lines*"), True, repr(terminal))
 
 
-# What other states of a stream make of a report, what damage of a pool does, and what cuts
-# leave: a text, what stands there instead, and the message.
-NUMBER = "expected a decimal number up to 4294967295 at the right of 8 columns in column 18, "
+# What no change of one value makes: other states of a stream, the library's warnings.
 NUMBERS = ("        e", " 88      ", " ******88", "      088", "        88", " 4294967296")
 CHANGES = [
-    *((" :       88\n", f" :{number}\n", f"line 4: {NUMBER}") for number in NUMBERS),
-    (" 12.500%", "12.5000%", "line 40: expected a number with three decimals at the right of 7"),
-    (" 12.500%", "  12.50%", "line 40: expected a number with three decimals at the right of 7"),
-    ("+---------+\n", "+\n", "line 114: expected a rule over 8 boxes"),
-    ("| FREE    | \n", "| FREE    | FREE    | \n", "line 115: expected the end of the line"),
-    ("#002\n", "#2\n", "expected a number filled with zeros to 3 columns in column 21"),
-    ("#002\n", "#0002\n", "expected a number filled with zeros to 3 columns in column 21"),
-    ("Next1       :        0", "Next1       :      0x0", "expected an address at the right of 8"),
-    ("Exp $\n", "Exp $\r\n", "line 2: expected a line end of CR and LF in front of this"),
-    ("MemPool::Mgr", "MemPool::Mgr x\nMemPool::Mgr", "line 2: expected \"   Version     : \","),
-    ("Enabled     :        1\n", "Enabled     :        0\n", "line 15: Enabled is 0, and the pool"),
-    ("***\n", "***+\n", "line 30: the bar has a \"+\"\n"),
-    ("2e8 \n\n", "2e8 \nWARNING:../s/MemPool:  110: Number of recs 7 < 8\n\n",
-     "line 106: the library warns of what it found"),
+    *((" :       88\n", f" :{number}\n") for number in NUMBERS), (" 12.500%", "12.5000%"),
+    (" 12.500%", "  12.50%"), ("+---------+\n", "+\n"), ("| FREE    | \n", 2 * "| FREE    " + "| \n"),
+    ("#002\n", "#2\n"), ("#002\n", "#0002\n"), ("Next1       :        0", "Next1       :      0x0"),
+    ("Exp $\n", "Exp $\r\n"), ("MemPool::Mgr", "MemPool::Mgr x\nMemPool::Mgr"),
+    ("2e8 \n\n", "2e8 \nWARNING:../s/MemPool:  110: Number of recs 7 < 8\n\n"),
     (" 0 \n\n\n   MemPool::Bucket #002", " 0 \nWARNING:../s/MemPool:12345: Too many free recs "
-     "7 > 6\n\n\n   MemPool::Bucket #002", "line 143: the library warns of what it found"),
+     "7 > 6\n\n\n   MemPool::Bucket #002"),
 ]
 
 
@@ -156,6 +145,7 @@ def changed_reports():
     changes = [(*found.span(), another(found[0])) for found in list(values)[::2]]
     changes += [(*found.span(), "") for found in list(re.finditer(".*\n", DETAILED))[::2]]
     changes += [(end, len(DETAILED), "") for end in range(0, len(DETAILED), 97)]
+    changes += [(DETAILED.index(old), DETAILED.index(old) + len(old), new) for old, new in CHANGES]
     for start, end, new in changes:
         yield DETAILED.count("\n", 0, start) + 1, DETAILED[:start] + new + DETAILED[end:]
 
@@ -173,12 +163,6 @@ def changed_documents(document):
 def test_changes():
     """The golden text has each message, how often it names the line of the change, and how often
     not."""
-    for old, new, message in CHANGES:
-        text = DETAILED.replace(old, new, 1)
-        output, errors, _ = run(PROGRAM, "report", "--check", given=text)
-        same(message in output + errors, True, f"{new!r}: {output}{errors}, expected {message}")
-        if output:
-            data_of(text)
     messages = Counter()
     for line, text in changed_reports():
         messages.update(messages_on(text, line))
