@@ -80,17 +80,13 @@ void DbgMapData(std::ostream& os, const Bucket& bucket, std::uint16_t cells, std
                 const Recs& recs) {
   Margin(os) << "| ";
   for (std::uint32_t i = first; i < first + cells; ++i) {
-    switch (TypeAt(bucket, bucket.OffsetOf(recs[i]))) {
-    case RecType::Free:
+    const RecType type = TypeAt(bucket, bucket.OffsetOf(recs[i]));
+    if (type == RecType::Free)
       TaggedBox(os, "n=", recs[i]->Offset());
-      break;
-    case RecType::Used:
+    else if (type == RecType::Used)
       TaggedBox(os, "d=", bucket.recSize - recHeaderSize);
-      break;
-    default:
+    else
       TaggedBox(os, "u=", 0u);
-      break;
-    }
   }
   os << std::endl;
 }

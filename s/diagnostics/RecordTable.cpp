@@ -16,7 +16,7 @@ void Bucket::DbgRecs(std::ostream& os, std::uint32_t depth) const {
   Table table(os, depth, BucketColumns::records);
   std::uint32_t count = 0;
   ForEachRecord(*this, [&](std::uint32_t offset) {
-    const std::uint8_t type = TypeAt(*this, offset);
+    const RecType type = TypeAt(*this, offset);
     const std::uint32_t dataSize = type == RecType::Used ? recSize - recHeaderSize : 0;
     table.Row().Id(++count).Cell(TypeLabel(type)).Cell(offset).Cell(recSize);
     table.Cell(offset + recSize).Cell(dataSize).Cell(PtrText(RecAt(offset))).End();

@@ -13,11 +13,11 @@
 
 namespace VOK::MemPool {
 
-/// The type byte of a record that has none within the area.
-inline constexpr std::uint8_t noType = 255;
+/// The type of a record that has no such byte within the area.
+inline constexpr RecType noType{255};
 
-/// The type byte of the record at `offset`, read again.
-inline std::uint8_t TypeAt(const Bucket& bucket, std::uint32_t offset) {
+/// The type of the record at `offset`, read again.
+inline RecType TypeAt(const Bucket& bucket, std::uint32_t offset) {
   return offset + offsetof(Rec, type) < bucket.recsSize ? bucket.RecAt(offset)->type : noType;
 }
 
@@ -27,8 +27,8 @@ inline bool HoldsHeader(const Bucket& bucket, std::uint32_t offset) {
   return offset >= 2 && offset + recHeaderSize <= bucket.recsSize;
 }
 
-/// A type byte's name in all reports.
-inline const char* TypeLabel(std::uint8_t type) {
+/// A type's name in all reports.
+inline const char* TypeLabel(RecType type) {
   switch (type) {
   case RecType::Free:
     return TypeName::free;
@@ -36,9 +36,8 @@ inline const char* TypeLabel(std::uint8_t type) {
     return TypeName::used;
   case RecType::Ext:
     return TypeName::ext;
-  default:
-    return TypeName::unknown;
   }
+  return TypeName::unknown;
 }
 
 } // namespace VOK::MemPool

@@ -21,7 +21,7 @@ void ExtRec::Destroy(ExtRec* e) noexcept { ::operator delete[](e); }
 __attribute__((no_sanitize_address)) ExtRec* ExtRec::FromData(const void* p) {
   if (p == nullptr) return nullptr;
   const auto* const end = static_cast<const std::uint8_t*>(p);
-  if (end[-4] != 0xAA || end[-3] != 0xBB || end[-2] != RecType::Ext || end[-1] != 0xCC)
+  if (end[-4] != 0xAA || end[-3] != 0xBB || RecType{end[-2]} != RecType::Ext || end[-1] != 0xCC)
     return nullptr;
   if ((end[-8] | end[-7] | end[-6] | end[-5]) == 0) return nullptr;
   return reinterpret_cast<ExtRec*>(reinterpret_cast<std::uintptr_t>(p) - sizeof(ExtRec));

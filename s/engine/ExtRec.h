@@ -30,7 +30,7 @@ struct ExtRec {
   std::uint32_t length; ///< the size as asked for
   std::uint8_t tag0;    ///< 0xAA: with tag1, what an offset would be in a record
   std::uint8_t tag1;    ///< 0xBB
-  std::uint8_t type;    ///< RecType Ext, where a record has its type
+  RecType type;         ///< Ext, where a record has its type
   std::uint8_t tag3;    ///< 0xCC
 
   /// A block for `size` bytes of data, linked into nothing. It comes from `operator new[]`, whose

@@ -72,8 +72,12 @@ void Group::Clear() noexcept {
   numBuckets = numFreeBuckets = 0;
 }
 
+// The Group knows the sizes, so that a damaged header neither leads out of its block nor stays.
 void Group::Reset() noexcept {
+  const std::uint32_t stride = dataSize + recHeaderSize;
   for (Bucket* b = head1; b != nullptr; b = b->next1) {
+    b->recSize = static_cast<std::uint16_t>(stride);
+    b->recsSize = static_cast<std::uint16_t>(2 + totalRecs * stride);
     b->Carve();
     b->next2 = b->next1;
     b->prev2 = b->prev1;

@@ -44,7 +44,8 @@ struct Group {
   /// Releases all buckets, in whatever state they are.
   void Clear() noexcept;
 
-  /// Gives every bucket the free list of a new one, and makes the second list equal to the first.
+  /// Makes every bucket as new, whatever its header says of its records, and the second list equal
+  /// to the first.
   void Reset() noexcept;
 
   /// Puts `b` at the head of the second list. Its `prev2` is null already: a bucket only ever

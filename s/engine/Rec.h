@@ -14,9 +14,9 @@
 
 namespace VOK::MemPool {
 
-/// What byte 2 of a header says. `Ext` is the type of an ExtRec, whose header ends in the same
-/// shape.
-enum RecType : std::uint8_t { Free = 0, Used = 1, Ext = 2 };
+/// What byte 2 of a header says; a damaged header holds any other value. `Ext` is the type of an
+/// ExtRec, whose header ends in the same shape.
+enum class RecType : std::uint8_t { Free = 0, Used = 1, Ext = 2 };
 
 /// ```
 ///     0          1           2      3         4
@@ -28,7 +28,7 @@ enum RecType : std::uint8_t { Free = 0, Used = 1, Ext = 2 };
 struct Rec {
   std::uint8_t offsetLow;  ///< low byte of the next free record's offset, or of this one's own
   std::uint8_t offsetHigh; ///< high byte of the same
-  std::uint8_t type;       ///< a RecType: says which of the two offsets the header holds
+  RecType type;            ///< says which of the two offsets the header holds
   std::uint8_t unused;     ///< stays as the heap delivered it
 
   static VOK_ALWAYS_INLINE Rec* FromData(void* p) {

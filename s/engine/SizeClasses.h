@@ -4,13 +4,13 @@
 #ifndef VOK_MEMPOOL_SIZECLASSES_H
 #define VOK_MEMPOOL_SIZECLASSES_H
 
+#include "MemPool"
+
 #include <bit>
 #include <cstdint>
 
 namespace VOK::MemPool {
 
-/// The largest request. Below it a rounded size and a size with its header stay within 32 bits.
-inline constexpr std::uint32_t maxRequest = 0x3FFFFFFF;
 /// The largest record area of a bucket, whose size and offsets are 16 bits wide.
 inline constexpr std::uint32_t maxBucketSize = 65535;
 /// The largest data alignment, a setting of 16 bits.
@@ -19,7 +19,7 @@ inline constexpr std::uint32_t maxDataAlignment = 65535;
 inline constexpr std::uint32_t recHeaderSize = 4;
 
 static_assert(std::uint64_t{maxRequest} + maxDataAlignment + recHeaderSize <= UINT32_MAX,
-              "rounding a request up can't wrap");
+              "a rounded request and its header stay within 32 bits");
 
 /// The smallest multiple of `multiple` that is at least `value`; `multiple` itself for 0.
 /// REQUIRES: `multiple` is not 0, and the result fits.

@@ -1,5 +1,5 @@
-// The table of environment keys and its reader, the banner, and the exported functions.
-// Test: tests/model_test.cpp, tests/process_test.py.
+// The table of settings, the reader of their environment keys, the banner, and the exported
+// functions. Test: tests/model_test.cpp, tests/process_test.py.
 #include "services/Settings.h"
 
 #include "MemPool"
@@ -24,65 +24,51 @@ namespace {
 
 const char* const version = "$Id: MemPool,v 1.2.52.4 2009/08/10 21:28:15 qrt Exp $";
 
-bool bannerWanted = false;
+bool bannerWanted;
 
-/// A key, whether it is looked up at all, and what its number does. A number that fails its test
-/// is dropped in silence.
-struct Key {
-  const char* name;
-  bool (*isOpen)();
-  void (*take)(int n);
+/// A setting and its environment key. A number that fails its test is dropped without a message.
+struct Setting {
+  const char* key;
+  int byDefault; ///< stored before any key is read
+  bool (*counts)(int n);
+  void (*store)(int n);
+  const char* secondKey = nullptr; ///< looked up where the number of the first doesn't count
 };
 
-bool Always() { return true; }
-bool WhileOff() { return off; }
+bool IsPositive(int n) { return n > 0; }
+bool Any(int) { return true; }
 
 // In the order of reading.
-constexpr Key keys[] = {
-    {"ZOR_VOK_MEMPOOL_ON", Always,
-     [](int n) {
-       if (n > 0) off = false;
-     }},
-    {"ZOR_MEMPOOL_ON", WhileOff,
-     [](int n) {
-       if (n > 0) off = false;
-     }},
-    {"ZOR_VOK_MEMPOOL_TRACE", Always,
-     [](int n) {
-       if (n > 0) Observers::SetTracing(true);
-     }},
-    {"ZOR_VOK_MEMPOOL_BUCKET_SIZE", Always,
-     [](int n) {
-       if (n >= 0) bucketSize = static_cast<std::uint32_t>(n);
-     }},
-    {"ZOR_VOK_MEMPOOL_MAX_RECORD_SIZE", Always,
-     [](int n) {
-       if (static_cast<std::uint32_t>(n) <= 32767) maxRecordSize = static_cast<std::uint32_t>(n);
-     }},
-    {"ZOR_VOK_MEMPOOL_MIN_RECORD_SIZE", Always,
-     [](int n) {
-       if (static_cast<std::uint32_t>(n) >= 4) minRecordSize = static_cast<std::uint32_t>(n);
-     }},
-    {"ZOR_VOK_MEMPOOL_DATA_ALIGNMENT", Always,
+constexpr Setting settings[] = {
+    {"ZOR_VOK_MEMPOOL_ON", 0, IsPositive, [](int n) { off = n <= 0; }, "ZOR_MEMPOOL_ON"},
+    {"ZOR_VOK_MEMPOOL_TRACE", 0, IsPositive, [](int n) { Observers::SetTracing(n > 0); }},
+    {"ZOR_VOK_MEMPOOL_BUCKET_SIZE", 4010, [](int n) { return n >= 0; },
+     [](int n) { bucketSize = static_cast<std::uint32_t>(n); }},
+    {"ZOR_VOK_MEMPOOL_MAX_RECORD_SIZE", 1000, [](int n) { return n >= 0 && n <= 32767; },
+     [](int n) { maxRecordSize = static_cast<std::uint32_t>(n); }},
+    {"ZOR_VOK_MEMPOOL_MIN_RECORD_SIZE", 8, [](int n) { return n < 0 || n >= 4; },
+     [](int n) { minRecordSize = static_cast<std::uint32_t>(n); }},
+    {"ZOR_VOK_MEMPOOL_DATA_ALIGNMENT", 4, Any,
      [](int n) { dataAlignment = n > 0 ? static_cast<std::uint16_t>(n) : 1; }},
-    {"ZOR_VOK_MEMPOOL_KEEP_EMPTY_BUCKETS", Always, [](int n) { keepEmptyBuckets = n > 0; }},
-    {"ZOR_VOK_MEMPOOL_INFO", Always, [](int n) { bannerWanted = n >= 0; }},
+    {"ZOR_VOK_MEMPOOL_KEEP_EMPTY_BUCKETS", 0, Any, [](int n) { keepEmptyBuckets = n > 0; }},
+    {"ZOR_VOK_MEMPOOL_INFO", -1, [](int n) { return n >= 0; },
+     [](int n) { bannerWanted = n >= 0; }},
 };
 
-void StoreDefaults() {
-  bucketSize = 4010;
-  maxRecordSize = 1000;
-  minRecordSize = 8;
-  dataAlignment = 4;
-  keepEmptyBuckets = false;
-  off = true;
+/// Stores the number of an environment key; false if there is none that counts.
+bool Read(const char* key, const Setting& setting) {
+  const char* const text = Tarn_Env::GetEnv(key);
+  if (text == nullptr) return false;
+  const int n = std::atoi(text);
+  if (!setting.counts(n)) return false;
+  setting.store(n);
+  return true;
 }
 
 void ReadKeys() {
-  for (const Key& key : keys) {
-    if (!key.isOpen()) continue;
-    if (const char* const text = Tarn_Env::GetEnv(key.name)) key.take(std::atoi(text));
-  }
+  for (const Setting& setting : settings)
+    if (!Read(setting.key, setting) && setting.secondKey != nullptr)
+      Read(setting.secondKey, setting);
 }
 
 void WriteBanner() {
@@ -102,7 +88,8 @@ void WriteBanner() {
 } // namespace
 
 void Load() {
-  StoreDefaults();
+  for (const Setting& setting : settings)
+    setting.store(setting.byDefault);
   ReadKeys();
   if (bannerWanted) WriteBanner();
   if (minRecordSize >= maxRecordSize)
