@@ -5,6 +5,7 @@
 
 #include "engine/Bucket.h"
 #include "engine/BucketMgr.h"
+#include "engine/Budget.h"
 #include "engine/ExtRec.h"
 #include "engine/FastPath.h"
 #include "engine/Group.h"
@@ -223,7 +224,7 @@ TEST_F(Pools, EndedTwice) {
   EXPECT_EQ(mgr->GetBucketMgr(), nullptr);
   mgr->~Mgr();
   for (const ArenaHeap::Event& event : heap.events)
-    if (event.kind == '-' && event.size == sizeof(BucketMgr)) {
+    if (event.kind == '-' && event.size == sizeof(PoolBlock)) {
       EXPECT_EQ(event.bytes[offsetof(BucketMgr, numGroups)], 0);
       EXPECT_EQ(std::count(&event.bytes[offsetof(BucketMgr, groups)],
                            &event.bytes[offsetof(BucketMgr, extRecs)], 0),

@@ -33,7 +33,8 @@ INFO=0 ON=2 MAX_RECORD_SIZE=0 : say main -> banner 4010 4 0 0 8 0 0; !EXCEPTION 
 INFO=-1 MIN_RECORD_SIZE=-1 : say main -> !EXCEPTION 12: (4294967295>=1000); aborted
 
 # The ERROR lines of a handle, then those of a pool.
-ON=* TRACE=1 : pool a; set max=5000; pool a -> zvpt:c:@1; ERROR 1: duplicate 'a'; status 1
+ON=* TRACE=1 : pool a; set max=5000; pool a | names
+    -> zvpt:c:@1; ERROR 1: duplicate 'a'; 1 pools: a; status 1
 ON=* : pool __VOK_MEMPOOL_00001; nameless -> ERROR 1: duplicate '__VOK_MEMPOOL_00001'; status 1
 ON=* : grouping; pool a; alloc 4294967295 -> ERROR 2: limit 4294967295; status 1
 

@@ -88,10 +88,14 @@ void WriteHeader(std::ostream& os, std::uint32_t depth, const BucketMgr& pool,
   HeaderNumber(os, indent, PoolLabel::sizeofUsed, sizeof(Rec));
 }
 
-void ReportAll(bool detailed) {
-  // Through the handle that built the pool, which may hold another one by now.
-  for (const auto& [name, pool] : MgrRegistry::Entries())
-    pool->mgr->GetBucketMgr()->Dbg(StandardOutput(), 0, detailed, detailed, detailed);
+void Report(const Mgr& mgr, std::ostream& os, bool detailed) {
+  mgr.GetBucketMgr()->Dbg(os, 0, detailed, detailed, detailed);
+}
+
+// Through the handle that built the pool, which may hold another one by now.
+void ReportAll(std::ostream& os, bool detailed) {
+  for (const Mgr* const mgr : MgrRegistry::Handles())
+    Report(*mgr, os, detailed);
 }
 
 } // namespace
@@ -114,12 +118,16 @@ void BucketMgr::Dbg(std::ostream& os, std::uint32_t depth, bool detailed, bool s
   });
 }
 
-void Mgr::Dbg() const { bucketMgr->Dbg(StandardOutput(), 0, false, false, false); }
+void Mgr::Dbg() const { Report(*this, StandardOutput(), false); }
+void Mgr::Dbg(std::ostream& os) const { Report(*this, os, false); }
 
-void Mgr::DbgDetailed() const { bucketMgr->Dbg(StandardOutput(), 0, true, true, true); }
+void Mgr::DbgDetailed() const { Report(*this, StandardOutput(), true); }
+void Mgr::DbgDetailed(std::ostream& os) const { Report(*this, os, true); }
 
-void Dbg() { ReportAll(false); }
+void Dbg() { ReportAll(StandardOutput(), false); }
+void Dbg(std::ostream& os) { ReportAll(os, false); }
 
-void DbgDetailed() { ReportAll(true); }
+void DbgDetailed() { ReportAll(StandardOutput(), true); }
+void DbgDetailed(std::ostream& os) { ReportAll(os, true); }
 
 } // namespace VOK::MemPool

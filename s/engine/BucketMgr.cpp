@@ -5,13 +5,13 @@
 
 #include "base/KeepStores.h"
 #include "engine/Bucket.h"
+#include "engine/Budget.h"
 #include "engine/ExtRec.h"
 #include "engine/FastPath.h"
 #include "engine/Group.h"
 #include "services/HeapTop.h"
 #include "services/Messages.h"
 #include "services/Observers.h"
-#include "services/Settings.h"
 #include "services/Trace.h"
 
 #include <algorithm>
@@ -20,16 +20,16 @@
 
 namespace VOK::MemPool {
 
-BucketMgr::BucketMgr(Mgr* mgr_, const std::string& name_)
+BucketMgr::BucketMgr(Mgr* mgr_, const std::string& name_, const Settings::Snapshot& settings)
     : name(name_), mgr(mgr_), groups(nullptr), extRecs(nullptr), numGroups(0), numExtRecs(0),
-      bucketSize(std::min(Settings::bucketSize, maxBucketSize)),
-      dataAlignment(std::max<std::uint32_t>(Settings::dataAlignment, 1)),
-      keepEmptyBuckets(Settings::keepEmptyBuckets) {
+      bucketSize(std::min(settings.bucketSize, maxBucketSize)),
+      dataAlignment(std::max(settings.dataAlignment, 1u)),
+      keepEmptyBuckets(settings.keepEmptyBuckets) {
   if (Trace::IsOn()) Trace::Constructed(this);
-  enabled = !Settings::off;
+  enabled = settings.on;
 
   const RecSizeRange range =
-      Normalise(Settings::minRecordSize, Settings::maxRecordSize, dataAlignment);
+      Normalise(settings.minRecordSize, settings.maxRecordSize, dataAlignment);
   if (range.max + recHeaderSize > bucketSize)
     Messages::Error({"Unexpected condition: ", "the maximum record size is larger than ",
                      "the bucket size (", range.max, ">", bucketSize - recHeaderSize, ") [",
@@ -62,7 +62,13 @@ VOK_NOINLINE void* BucketMgr::AllocSlow(std::uint32_t size) {
 }
 
 VOK_NOINLINE void* BucketMgr::AllocExtRec(std::uint32_t size) {
+  Budget& budget = BudgetOf(*this);
+  const std::uint64_t bytes = sizeof(ExtRec) + std::uint64_t{size};
+  while (!budget.Admits(bytes))
+    budget.AskFor(bytes, *mgr);
+  Budget::Room room(budget, bytes);
   ExtRec* const e = ExtRec::Create(size);
+  room.Fill();
   e->Link(extRecs, numExtRecs);
   return e->Data();
 }
@@ -76,6 +82,7 @@ VOK_NOINLINE bool BucketMgr::FreeSlow(void* p) {
   ExtRec* const e = FindExtRec(p);
   if (e == nullptr) return false;
   e->Unlink(extRecs, numExtRecs);
+  BudgetOf(*this).Remove(sizeof(ExtRec) + std::uint64_t{e->length});
   e->Scrub();
   ExtRec::Destroy(e);
   return true;
@@ -155,6 +162,7 @@ bool BucketMgr::Reset() noexcept {
 void BucketMgr::ReleaseExtRecs() noexcept {
   for (ExtRec* e = extRecs; e != nullptr;) {
     ExtRec* const next = e->next;
+    BudgetOf(*this).Remove(sizeof(ExtRec) + std::uint64_t{e->length});
     ExtRec::Destroy(e);
     e = next;
   }

@@ -5,6 +5,7 @@
 #define VOK_MEMPOOL_BUCKETMGR_H
 
 #include "engine/SizeClasses.h"
+#include "services/Settings.h"
 
 #include <cstddef>
 #include <cstdint>
@@ -45,9 +46,9 @@ struct BucketMgr {
   bool enabled;                ///< the pool pools; false: every request goes to the heap
   FastIndex fastIndex;         ///< derived from the sizes: from a size to its index
 
-  /// Takes the snapshot and makes the table. Ends the process if the settings make a pool
-  /// impossible; throws what `operator new[]` throws.
-  BucketMgr(Mgr* mgr, const std::string& name);
+  /// Makes the table under these settings. Ends the process if they make a pool impossible; throws
+  /// what `operator new[]` throws.
+  BucketMgr(Mgr* mgr, const std::string& name, const Settings::Snapshot& settings);
 
   /// Releases everything, used or not.
   ~BucketMgr();

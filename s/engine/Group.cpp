@@ -2,6 +2,8 @@
 // Test: tests/model_test.cpp.
 #include "engine/Group.h"
 
+#include "engine/Budget.h"
+
 #include <cassert>
 #include <memory>
 
@@ -20,14 +22,25 @@ Group::Group(BucketMgr* owner_, std::uint16_t dataSize_)
       totalRecs(
           static_cast<std::uint16_t>((owner_->bucketSize - 2) / (dataSize_ + recHeaderSize))) {}
 
-// Out of memory, the heap runs the program's new-handler, which may clear the pool and with it
-// destroy this Group: the way goes on in the Group that the pool has afterwards.
+// At the limit the pool asks the program, and out of memory the heap runs its new-handler. Either
+// may clear the pool and with it destroy this Group, or free a record of it: the request goes on in
+// the Group that the pool has afterwards.
 VOK_NOINLINE void* Group::AllocFromNewBucket() {
   BucketMgr* const pool = owner;
+  Budget& budget = BudgetOf(*pool);
   const std::uint16_t size = dataSize;
-  std::unique_ptr<Bucket, DestroyBucket> b(Bucket::Create(this, pool->bucketSize, size));
+  const std::uint64_t bytes = BlockSize();
+  while (!budget.Admits(bytes)) {
+    budget.AskFor(bytes, *pool->mgr);
+    Group* const group = pool->GroupFor(size);
+    if (group->head2 != nullptr) return group->Alloc();
+  }
+  Budget::Room room(budget, bytes);
+  std::unique_ptr<Bucket, DestroyBucket> b(Bucket::Create(nullptr, pool->bucketSize, size));
   Group* const group = pool->GroupFor(size);
   b->parent = group;
+  room.Fill();
+  budget.newest = b.get();
   group->Link(b.release());
   return group->Alloc();
 }
@@ -50,6 +63,7 @@ VOK_NOINLINE bool Group::ReleaseEmptied(Bucket* b) {
   }
   UnlinkAll(b);
   if (!wasFull) UnlinkFree(b);
+  BudgetOf(*owner).Remove(BlockSize());
   Bucket::Destroy(b);
   return true;
 }
@@ -68,6 +82,7 @@ void Group::Clear() noexcept {
     Bucket::Destroy(b);
     b = next;
   }
+  BudgetOf(*owner).Remove(numBuckets * BlockSize());
   head1 = head2 = nullptr;
   numBuckets = numFreeBuckets = 0;
 }

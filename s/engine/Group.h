@@ -41,6 +41,11 @@ struct Group {
   /// REQUIRES: `p` is a used record of `bucket`, whose parent is this Group.
   bool TakeBack(void* p, Bucket* bucket);
 
+  /// The bytes of each bucket's heap block.
+  std::uint64_t BlockSize() const {
+    return recsBaseOffset + 2 + std::uint64_t{totalRecs} * (dataSize + recHeaderSize);
+  }
+
   /// Releases all buckets, in whatever state they are.
   void Clear() noexcept;
 

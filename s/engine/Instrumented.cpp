@@ -3,12 +3,14 @@
 // Test: tests/output_test.cpp, tests/process_test.py.
 #include "engine/Bucket.h"
 #include "engine/BucketMgr.h"
+#include "engine/Budget.h"
 #include "engine/ExtRec.h"
 #include "engine/Group.h"
 #include "services/Observers.h"
 #include "services/Trace.h"
 
 #include <cstdint>
+#include <utility>
 
 namespace VOK::MemPool {
 
@@ -53,8 +55,6 @@ VOK_NOINLINE bool BucketMgr::FreeInstrumented(void* p) {
   return enabled && Observers::Present() ? FreeReported(p) : FreeSlow(p);
 }
 
-// A record comes from a new bucket exactly where its Group has no free one. The Group is made
-// before that is asked: a new-handler that runs meanwhile may give it a bucket.
 void* BucketMgr::AllocReported(std::uint32_t size) {
   const Observers::Quiet quiet;
   const std::uint32_t dataSize = RoundUp(size, dataAlignment);
@@ -65,10 +65,9 @@ void* BucketMgr::AllocReported(std::uint32_t size) {
     Observers::RecordMade(e, p, size, size);
     return p;
   }
-  const bool makesBucket = GroupFor(dataSize)->head2 == nullptr;
   void* const p = AllocSlow(size);
   Bucket* const bucket = FindBucket(p);
-  if (makesBucket) ReportMade(bucket);
+  if (std::exchange(BudgetOf(*this).newest, nullptr) == bucket) ReportMade(bucket);
   Observers::RecordMade(bucket, p, size, bucket->recSize - recHeaderSize);
   return p;
 }

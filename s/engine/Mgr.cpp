@@ -4,11 +4,14 @@
 
 #include "base/KeepStores.h"
 #include "engine/BucketMgr.h"
+#include "engine/Budget.h"
 #include "engine/FastPath.h"
 #include "engine/Invariants.h"
 #include "services/Messages.h"
 #include "services/MgrRegistry.h"
+#include "services/Settings.h"
 
+#include <cstdint>
 #include <memory>
 #include <string>
 
@@ -16,8 +19,12 @@ namespace VOK::MemPool {
 
 namespace {
 
-[[noreturn]] VOK_NOINLINE void StopTooLarge(unsigned size) {
+[[noreturn]] VOK_NOINLINE void StopTooLarge(std::uint64_t size) {
   Messages::Error({"Cannot allocate ", size, " bytes, ", "the maximum is ", maxRequest});
+}
+
+[[noreturn]] VOK_NOINLINE void StopDuplicate(const std::string& name) {
+  Messages::Error({"Duplicate Vok_MemPool::Mgr name encountered '", name.c_str(), "'"});
 }
 
 } // namespace
@@ -26,19 +33,21 @@ Mgr* MgrRegistry::HandleOf(const BucketMgr* pool) { return pool->mgr; }
 
 Mgr::Mgr() : Mgr(nullptr) {}
 
+// The name is looked up first, so that a pool that can't be entered isn't constructed; another
+// thread may enter one of that name meanwhile.
 Mgr::Mgr(const char* name) : bucketMgr(nullptr) {
   const std::string text = name != nullptr ? name : MgrRegistry::NextAutomaticName();
-  if (MgrRegistry::Find(text) != nullptr)
-    Messages::Error({"Duplicate Vok_MemPool::Mgr name encountered '", text.c_str(), "'"});
-  auto pool = std::make_unique<BucketMgr>(this, text);
-  MgrRegistry::Enter(text, pool.get());
-  bucketMgr = pool.release();
+  if (MgrRegistry::Contains(text)) StopDuplicate(text);
+  auto block = std::make_unique<PoolBlock>(this, text, Settings::Now());
+  bucketMgr = &block->pool;
+  if (!MgrRegistry::Enter(text, bucketMgr)) StopDuplicate(text);
+  static_cast<void>(block.release());
 }
 
 Mgr::~Mgr() {
   if (bucketMgr == nullptr) return;
   MgrRegistry::Remove(bucketMgr->name);
-  delete bucketMgr;
+  delete &PoolBlock::Of(*bucketMgr);
   bucketMgr = nullptr;
   KeepStores(this);
 }
@@ -71,6 +80,11 @@ void Mgr::Clear() {
 bool Mgr::Reset() {
   const Checked checked(bucketMgr);
   return bucketMgr->Reset();
+}
+
+void* Mgr::AllocWide(unsigned long long size) {
+  if (size > maxRequest) StopTooLarge(size);
+  return Alloc(static_cast<unsigned>(size));
 }
 
 unsigned Mgr::GetSize(const void* p) const { return bucketMgr->GetSize(p); }

@@ -4,6 +4,7 @@
 
 #include "services/Observers.h"
 
+#include <atomic>
 #include <cerrno>
 #include <cstdlib>
 
@@ -26,7 +27,7 @@ constexpr std::uint64_t trimThreshold = 128u << 10;
 /// Below the size that glibc maps by default, and above the holes that single buckets leave.
 constexpr std::size_t plugBlock = 96u << 10;
 
-bool isGlibcs = false; ///< the heap is glibc's; settled by the first KeepSlack
+std::atomic<bool> isGlibcs = false; ///< the heap is glibc's; settled by the first KeepSlack
 
 // Other allocators export glibc's names for malloc, too. So the question is in which library the
 // program's malloc lies.
@@ -55,9 +56,8 @@ void* Block(std::size_t size) {
 } // namespace
 
 void KeepSlack() {
-  static bool isAsked = false;
-  if (isAsked) return;
-  isAsked = true;
+  static std::atomic<bool> isAsked = false;
+  if (isAsked.exchange(true)) return;
   isGlibcs = IsGlibcs();
   if (isGlibcs) std::free(Block(slackBlock));
 }

@@ -1,22 +1,21 @@
-// The process-wide ordered map from a pool's name to the pool. It owns no pool. It is on no
-// path of a request: only the construction, destruction and listing of pools touch it.
-// Test: tests/registry_test.cpp.
+// The process-wide ordered map from a pool's name to the pool, under a lock. It owns no pool. It is
+// on no path of a request: only the construction, destruction and listing of pools touch it.
+// Test: tests/registry_test.cpp, tests/threads_test.cpp.
 #ifndef VOK_MEMPOOL_MGRREGISTRY_H
 #define VOK_MEMPOOL_MGRREGISTRY_H
 
-#include <functional>
-#include <map>
 #include <string>
 #include <string_view>
+#include <vector>
 
 namespace VOK::MemPool {
 
 class Mgr;
 struct BucketMgr;
 
+/// Any thread may call these at any time. The lock is held for no allocation and no release, since
+/// a program's own heap and its new-handler may come back here.
 namespace MgrRegistry {
-
-using Map = std::map<std::string, BucketMgr*, std::less<>>;
 
 /// Constructs the map, empty. Called once, before anything else of the library.
 void Begin();
@@ -24,17 +23,23 @@ void Begin();
 /// Releases all entries and leaves an empty map that still works, since a Mgr can outlive it.
 void End() noexcept;
 
-/// All pools by ascending name.
-const Map& Entries();
+/// Whether a pool has that name. Another thread may enter one right after.
+bool Contains(std::string_view name);
 
-/// The pool of that name, null if there is none.
-BucketMgr* Find(std::string_view name);
+/// The handle of the pool of that name, null if there is none.
+Mgr* Find(std::string_view name);
 
-/// Enters a pool. REQUIRES: the name is not in use.
-void Enter(const std::string& name, BucketMgr* pool);
+/// The number of pools.
+unsigned Count();
+
+/// The handles of all pools by ascending name.
+std::vector<Mgr*> Handles();
+
+/// Enters a pool; false, with nothing changed, if the name is in use.
+bool Enter(const std::string& name, BucketMgr* pool);
 
 /// Removes the entry of that name, if there is one.
-void Remove(const std::string& name) noexcept;
+void Remove(std::string_view name) noexcept;
 
 /// The handle of a pool. The engine, which knows a pool's inside, defines it.
 Mgr* HandleOf(const BucketMgr* pool);

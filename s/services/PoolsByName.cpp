@@ -6,23 +6,22 @@
 
 namespace VOK::MemPool {
 
-Mgr* GetMgr(const char* name) {
-  const BucketMgr* const pool = MgrRegistry::Find(name != nullptr ? name : "");
-  return pool != nullptr ? MgrRegistry::HandleOf(pool) : nullptr;
-}
+Mgr* GetMgr(const char* name) { return MgrRegistry::Find(name != nullptr ? name : ""); }
 
 void GetMgrs(vector<Mgr*>& mgrs) {
-  mgrs.Reserve(GetNumMgrs());
-  for (const auto& [name, pool] : MgrRegistry::Entries())
-    mgrs.Append(MgrRegistry::HandleOf(pool));
+  const std::vector<Mgr*> all = MgrRegistry::Handles();
+  mgrs.Reserve(static_cast<unsigned>(all.size()));
+  for (Mgr* const mgr : all)
+    mgrs.Append(mgr);
 }
 
 void GetMgrs(std::vector<Mgr*>& mgrs) {
-  mgrs.reserve(GetNumMgrs());
-  for (const auto& [name, pool] : MgrRegistry::Entries())
-    mgrs.push_back(MgrRegistry::HandleOf(pool));
+  const std::vector<Mgr*> all = MgrRegistry::Handles();
+  mgrs.reserve(all.size());
+  for (Mgr* const mgr : all)
+    mgrs.push_back(mgr);
 }
 
-unsigned GetNumMgrs() { return static_cast<unsigned>(MgrRegistry::Entries().size()); }
+unsigned GetNumMgrs() { return MgrRegistry::Count(); }
 
 } // namespace VOK::MemPool

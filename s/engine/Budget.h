@@ -1,0 +1,83 @@
+// What a pool holds of the heap: its count, its peak, its limit. It is defined beside the
+// BucketMgr, in one block with it, since that one's layout is fixed. No request on the fast path
+// touches it. Test: tests/options_test.cpp.
+#ifndef VOK_MEMPOOL_BUDGET_H
+#define VOK_MEMPOOL_BUDGET_H
+
+#include "MemPool"
+#include "engine/BucketMgr.h"
+
+#include <algorithm>
+#include <cstddef>
+#include <cstdint>
+#include <new>
+
+namespace VOK::MemPool {
+
+struct Bucket;
+
+/// Counts the blocks of buckets and ExtRecs, with their headers.
+struct Budget {
+  std::uint64_t held = 0;                       ///< bytes
+  std::uint64_t peak = 0;                       ///< the most that it ever was
+  std::uint64_t limit = UINT64_MAX;             ///< a request that would pass it fails
+  decltype(Options::atLimit) atLimit = nullptr; ///< asked before such a request fails
+  void* context = nullptr;                      ///< the last argument of atLimit
+  const Bucket* newest = nullptr;               ///< the bucket made last, which may be gone
+
+  bool Admits(std::uint64_t bytes) const { return bytes <= limit && held <= limit - bytes; }
+
+  /// Asks the program for room; throws std::bad_alloc unless it answers that there may be some.
+  void AskFor(std::uint64_t bytes, Mgr& mgr) {
+    if (atLimit == nullptr || !atLimit(mgr, static_cast<std::size_t>(bytes), context))
+      throw std::bad_alloc();
+  }
+
+  /// Room for a block that is about to come from the heap. It counts at once, so that what a
+  /// new-handler allocates meanwhile can't pass the limit; no longer, if no block comes.
+  class Room {
+  public:
+    Room(Budget& budget_, std::uint64_t bytes_) : budget(budget_), bytes(bytes_) {
+      budget.held += bytes;
+    }
+    ~Room() { budget.Remove(bytes); }
+    Room(const Room&) = delete;
+    Room& operator=(const Room&) = delete;
+
+    /// The block is there.
+    void Fill() {
+      budget.peak = std::max(budget.peak, budget.held);
+      bytes = 0;
+    }
+
+  private:
+    Budget& budget;
+    std::uint64_t bytes;
+  };
+
+  /// The length of a damaged ExtRec may be more than all that is held.
+  void Remove(std::uint64_t bytes) { held -= std::min(held, bytes); }
+};
+
+/// The block that a pool lives in.
+struct PoolBlock {
+  BucketMgr pool;
+  Budget budget;
+
+  PoolBlock(Mgr* mgr, const std::string& name, const Settings::Snapshot& settings)
+      : pool(mgr, name, settings) {}
+
+  static PoolBlock& Of(BucketMgr& pool) { return reinterpret_cast<PoolBlock&>(pool); }
+  static const PoolBlock& Of(const BucketMgr& pool) {
+    return reinterpret_cast<const PoolBlock&>(pool);
+  }
+};
+
+static_assert(offsetof(PoolBlock, pool) == 0);
+
+inline Budget& BudgetOf(BucketMgr& pool) { return PoolBlock::Of(pool).budget; }
+inline const Budget& BudgetOf(const BucketMgr& pool) { return PoolBlock::Of(pool).budget; }
+
+} // namespace VOK::MemPool
+
+#endif
