@@ -1,5 +1,5 @@
-// Memory for the harness itself that doesn't come from the heap under test, so that what the
-// harness has freed can't serve a contender whose growth is measured.
+// Memory for the harness itself. It doesn't come from the heap under test: blocks that the harness
+// has freed would serve an allocator whose growth is measured.
 #ifndef VOK_BENCH_MAPPED_H
 #define VOK_BENCH_MAPPED_H
 

@@ -1,4 +1,5 @@
-// The workloads of the standard containers' nodes, over an allocator that keeps alignof(T).
+// The workloads of the standard containers' nodes, over an allocator that returns memory aligned to
+// alignof(T).
 #ifndef VOK_BENCH_NODES_H
 #define VOK_BENCH_NODES_H
 
@@ -16,35 +17,35 @@
 
 namespace Bench {
 
-/// An allocator of a rival. Where the rival aligns to less than T needs, it brings a way of its
-/// own.
-template <class T, class Rival>
+/// A standard allocator over an allocator under test. One that aligns to less than T needs has
+/// functions of its own for that.
+template <class T, class Allocator>
 class NodeAllocator {
 public:
   using value_type = T;
 
-  explicit NodeAllocator(Rival& rival_) : rival(&rival_) {}
+  explicit NodeAllocator(Allocator& allocator_) : allocator(&allocator_) {}
   template <class U>
-  explicit NodeAllocator(const NodeAllocator<U, Rival>& other) : rival(other.rival) {}
+  explicit NodeAllocator(const NodeAllocator<U, Allocator>& other) : allocator(other.allocator) {}
 
   T* allocate(std::size_t n) {
     const std::uint32_t size = SizeOf(n);
-    if constexpr (alignof(T) <= Rival::alignment)
-      return static_cast<T*>(rival->Alloc(size));
+    if constexpr (alignof(T) <= Allocator::alignment)
+      return static_cast<T*>(allocator->Alloc(size));
     else
-      return static_cast<T*>(rival->AllocAligned8(size));
+      return static_cast<T*>(allocator->AllocAligned8(size));
   }
 
   void deallocate(T* p, std::size_t n) {
     const std::uint32_t size = SizeOf(n);
-    if constexpr (alignof(T) <= Rival::alignment)
-      rival->Free(p, size);
+    if constexpr (alignof(T) <= Allocator::alignment)
+      allocator->Free(p, size);
     else
-      rival->FreeAligned8(p, size);
+      allocator->FreeAligned8(p, size);
   }
 
   friend bool operator==(const NodeAllocator& a, const NodeAllocator& b) {
-    return a.rival == b.rival;
+    return a.allocator == b.allocator;
   }
 
 private:
@@ -56,10 +57,10 @@ private:
     return static_cast<std::uint32_t>(n * sizeof(T)); // NOLINT(bugprone-sizeof-expression)
   }
 
-  Rival* rival;
+  Allocator* allocator;
 };
 
-/// A thousand keys in an order without a pattern, and none twice.
+/// A thousand distinct keys, in an order without a pattern.
 inline std::vector<std::uint32_t> Keys() {
   std::vector<std::uint32_t> keys;
   for (std::uint32_t i = 0; i < 1000; ++i)
@@ -67,19 +68,19 @@ inline std::vector<std::uint32_t> Keys() {
   return keys;
 }
 
-/// Each key entered, then each looked up and erased, in another order.
-template <class Map, class Rival>
+/// Inserts each key, then looks up and erases each in another order.
+template <class Map, class Allocator>
 class MapNodes {
 public:
   std::uint32_t Run(std::uint32_t times) {
     std::uint32_t sum = 0;
     for (std::uint32_t time = 0; time < times; ++time) {
-      Map map{typename Map::allocator_type(rival)};
+      Map map{typename Map::allocator_type(allocator)};
       for (const std::uint32_t key : keys)
         map.emplace(key, key + time);
       for (std::size_t i = 0; i < keys.size(); ++i) {
         const auto found = map.find(keys[(i * 7) % keys.size()]);
-        if (found == map.end()) continue; // then the checksum tells
+        if (found == map.end()) continue; // the checksum shows it
         sum += found->second;
         map.erase(found);
       }
@@ -90,30 +91,30 @@ public:
 private:
   static_assert(std::is_same_v<typename Map::key_type, std::uint32_t>);
 
-  Rival rival;
+  Allocator allocator;
   std::vector<std::uint32_t> keys = Keys();
 };
 
-template <class Rival>
+template <class Allocator>
 using TreeNodes =
     MapNodes<std::map<std::uint32_t, std::uint32_t, std::less<>,
-                      NodeAllocator<std::pair<const std::uint32_t, std::uint32_t>, Rival>>,
-             Rival>;
+                      NodeAllocator<std::pair<const std::uint32_t, std::uint32_t>, Allocator>>,
+             Allocator>;
 
-template <class Rival>
+template <class Allocator>
 using HashNodes = MapNodes<
     std::unordered_map<std::uint32_t, std::uint32_t, std::hash<std::uint32_t>, std::equal_to<>,
-                       NodeAllocator<std::pair<const std::uint32_t, std::uint32_t>, Rival>>,
-    Rival>;
+                       NodeAllocator<std::pair<const std::uint32_t, std::uint32_t>, Allocator>>,
+    Allocator>;
 
-/// A list filled at its end and emptied from its head.
-template <class Rival>
+/// Fills a list at its end and empties it from its head.
+template <class Allocator>
 class ListNodes {
 public:
   std::uint32_t Run(std::uint32_t times) {
     std::uint32_t sum = 0;
     for (std::uint32_t time = 0; time < times; ++time) {
-      List list{typename List::allocator_type(rival)};
+      List list{typename List::allocator_type(allocator)};
       for (const std::uint32_t key : keys)
         list.push_back(key + time);
       for (; !list.empty(); list.pop_front())
@@ -123,9 +124,9 @@ public:
   }
 
 private:
-  using List = std::list<std::uint32_t, NodeAllocator<std::uint32_t, Rival>>;
+  using List = std::list<std::uint32_t, NodeAllocator<std::uint32_t, Allocator>>;
 
-  Rival rival;
+  Allocator allocator;
   std::vector<std::uint32_t> keys = Keys();
 };
 

@@ -1,6 +1,6 @@
-// What a workload does with a record beside taking it: data is written at both ends of a record
-// when it is taken and read when it is given back. The sums of what was read must agree between all
-// contenders.
+// What a workload does with a record besides its allocation: it writes data at both ends when it
+// allocates the record and reads them when it frees it. The sums of the data read must agree
+// between all allocators.
 #ifndef VOK_BENCH_RECORD_H
 #define VOK_BENCH_RECORD_H
 
@@ -31,18 +31,18 @@ inline std::uint32_t Read(const void* p, std::uint32_t size) {
   return first + last;
 }
 
-template <class Rival>
-Block Take(Rival& rival, std::uint32_t size, std::uint32_t value) {
-  void* const p = rival.Alloc(size);
+template <class Allocator>
+Block AllocRecord(Allocator& allocator, std::uint32_t size, std::uint32_t value) {
+  void* const p = allocator.Alloc(size);
   Write(p, size, value);
   return {p, size};
 }
 
-/// The data of the block that goes.
-template <class Rival>
-std::uint32_t GiveBack(Rival& rival, const Block& block) {
+/// Frees the block and returns the sum of its data.
+template <class Allocator>
+std::uint32_t FreeRecord(Allocator& allocator, const Block& block) {
   const std::uint32_t sum = Read(block.p, block.size);
-  rival.Free(block.p, block.size);
+  allocator.Free(block.p, block.size);
   return sum;
 }
 

@@ -1,5 +1,5 @@
-// The workloads of plain records. Each is built before the clock runs; Run(times) does its work so
-// many times and returns the sum of the data read.
+// The workloads of plain records. Each is constructed before the clock runs; Run(times) does its
+// work `times` times and returns the sum of the data read.
 #ifndef VOK_BENCH_RECORDS_H
 #define VOK_BENCH_RECORDS_H
 
@@ -18,40 +18,40 @@
 
 namespace Bench {
 
-/// `depth` records taken and given back in reverse, over `live` others that stay.
-template <class Rival>
+/// Allocates `depth` records and frees them in reverse, over `live` others that stay.
+template <class Allocator>
 class Lifo {
 public:
   Lifo(std::uint32_t size_, std::uint32_t depth, std::uint32_t live)
-      : size(size_), others(live), taken(depth) {
+      : size(size_), others(live), records(depth) {
     for (void*& p : others)
-      p = Take(rival, size, 0).p;
+      p = AllocRecord(allocator, size, 0).p;
   }
 
   std::uint32_t Run(std::uint32_t times) {
     std::uint32_t sum = 0;
     for (std::uint32_t time = 0; time < times; ++time) {
-      for (void*& p : taken)
-        p = Take(rival, size, time).p;
-      for (std::size_t i = taken.size(); i-- > 0;)
-        sum += GiveBack(rival, {taken[i], size});
+      for (void*& p : records)
+        p = AllocRecord(allocator, size, time).p;
+      for (std::size_t i = records.size(); i-- > 0;)
+        sum += FreeRecord(allocator, {records[i], size});
     }
     return sum;
   }
 
 private:
-  Rival rival;
+  Allocator allocator;
   std::uint32_t size;
   std::vector<void*> others; // they live as long as the process
-  std::vector<void*> taken;
+  std::vector<void*> records;
 };
 
-/// `count` records taken, and given back in the same order, in reverse or at random.
-template <class Rival>
+/// Allocates `count` records and frees them in the same order, in reverse or at random.
+template <class Allocator>
 class Bulk {
 public:
   Bulk(std::uint32_t size_, std::uint32_t count, const std::string& order)
-      : size(size_), taken(count), places(count) {
+      : size(size_), records(count), places(count) {
     std::iota(places.begin(), places.end(), 0);
     if (order == "reverse")
       std::reverse(places.begin(), places.end());
@@ -64,10 +64,10 @@ public:
   std::uint32_t Run(std::uint32_t times) {
     std::uint32_t sum = 0;
     for (std::uint32_t time = 0; time < times; ++time) {
-      for (void*& p : taken)
-        p = Take(rival, size, time).p;
+      for (void*& p : records)
+        p = AllocRecord(allocator, size, time).p;
       for (const std::uint32_t place : places)
-        sum += GiveBack(rival, {taken[place], size});
+        sum += FreeRecord(allocator, {records[place], size});
     }
     return sum;
   }
@@ -80,9 +80,9 @@ private:
       std::swap(places[i - 1], places[random.Below(i, 1).first]);
   }
 
-  Rival rival;
+  Allocator allocator;
   std::uint32_t size;
-  std::vector<void*> taken;
+  std::vector<void*> records;
   std::vector<std::uint32_t> places;
 };
 
@@ -107,14 +107,14 @@ inline std::vector<std::uint32_t> RealisticSizes(std::uint32_t large) {
   return sizes;
 }
 
-/// One of `live` records of realistic sizes, picked at random, replaced by another.
-template <class Rival>
+/// Replaces one of `live` records of realistic sizes, picked at random, by another.
+template <class Allocator>
 class Churn {
 public:
   Churn(std::uint32_t live, std::uint32_t large)
       : sizes(RealisticSizes(large)), random(live), blocks(live) {
     for (Block& block : blocks)
-      block = Take(rival, sizes[random.Below(1, 1000).second], 0);
+      block = AllocRecord(allocator, sizes[random.Below(1, 1000).second], 0);
   }
 
   std::uint32_t Run(std::uint32_t times) {
@@ -122,26 +122,26 @@ public:
     for (std::uint32_t time = 0; time < times; ++time) {
       const auto [place, draw] = random.Below(static_cast<std::uint32_t>(blocks.size()), 1000);
       Block& block = blocks[place];
-      sum += GiveBack(rival, block);
-      block = Take(rival, sizes[draw], time);
+      sum += FreeRecord(allocator, block);
+      block = AllocRecord(allocator, sizes[draw], time);
     }
     return sum;
   }
 
 private:
-  Rival rival;
+  Allocator allocator;
   std::vector<std::uint32_t> sizes;
   Random random;
   std::vector<Block> blocks;
 };
 
-/// Churn in each of a few threads, with a pool of its own.
-template <class Rival>
+/// Churn in each of `count` threads, each with a pool of its own.
+template <class Allocator>
 class Threads {
 public:
   Threads(std::uint32_t count, std::uint32_t live) : sums(count) {
     for (std::uint32_t i = 0; i < count; ++i)
-      churns.push_back(std::make_unique<Churn<Rival>>(live, 0));
+      churns.push_back(std::make_unique<Churn<Allocator>>(live, 0));
   }
 
   std::uint32_t Run(std::uint32_t times) {
@@ -154,26 +154,26 @@ public:
   }
 
 private:
-  std::vector<std::unique_ptr<Churn<Rival>>> churns;
+  std::vector<std::unique_ptr<Churn<Allocator>>> churns;
   std::vector<std::uint32_t> sums;
 };
 
-/// `count` records built and all freed at once by the allocator's own call, if it has one: by
-/// Reset, which keeps the memory, where that is asked for, otherwise by Clear. Another allocator
-/// frees each.
-template <class Rival>
+/// Builds `count` records and frees all of them at once by the allocator's own call: by Reset,
+/// which keeps the memory, if `resets`, else by Clear. An allocator without that call frees each
+/// record.
+template <class Allocator>
 class Drop {
 public:
   Drop(std::uint32_t size_, std::uint32_t count, bool resets_)
-      : size(size_), resets(resets_), taken(count) {}
+      : size(size_), resets(resets_), records(count) {}
 
   std::uint32_t Run(std::uint32_t times) {
     std::uint32_t sum = 0;
     for (std::uint32_t time = 0; time < times; ++time) {
-      for (void*& p : taken)
-        p = Take(rival, size, time).p;
-      for (std::size_t i = 0; i < taken.size(); i += sample)
-        sum += Read(taken[i], size);
+      for (void*& p : records)
+        p = AllocRecord(allocator, size, time).p;
+      for (std::size_t i = 0; i < records.size(); i += sample)
+        sum += Read(records[i], size);
       FreeAll();
     }
     return sum;
@@ -181,23 +181,23 @@ public:
 
 private:
   void FreeAll() {
-    if constexpr (requires { rival.Reset(); }) {
-      if (resets) return rival.Reset();
+    if constexpr (requires { allocator.Reset(); }) {
+      if (resets) return allocator.Reset();
     }
-    if constexpr (requires { rival.Clear(); }) {
-      if (!resets) return rival.Clear();
+    if constexpr (requires { allocator.Clear(); }) {
+      if (!resets) return allocator.Clear();
     }
-    for (void* const p : taken)
-      rival.Free(p, size);
+    for (void* const p : records)
+      allocator.Free(p, size);
   }
 
-  // Reading all would hide what is gained by not visiting each record.
+  // Reading every record would hide what an allocator gains by not visiting each.
   static constexpr std::size_t sample = 64;
 
-  Rival rival;
+  Allocator allocator;
   std::uint32_t size;
   bool resets;
-  std::vector<void*> taken;
+  std::vector<void*> records;
 };
 
 } // namespace Bench

@@ -1,5 +1,5 @@
-// The workload of a recorded program: its calls in their order on a pool made for the run and gone
-// at its end, as the program's would be.
+// The workload of a recorded program: its calls in their order, on a pool that each run constructs
+// and destroys, as the program would.
 #ifndef VOK_BENCH_REPLAY_H
 #define VOK_BENCH_REPLAY_H
 
@@ -18,10 +18,11 @@ namespace Bench {
 
 /// The live blocks of a program under replay. `Filling` says whether a new block is written whole
 /// or at its ends.
-template <class Rival, bool Filling>
+template <class Allocator, bool Filling>
 class Program {
 public:
-  Program(Rival& rival_, MappedVector<Block>& blocks_) : rival(rival_), blocks(blocks_) {}
+  Program(Allocator& allocator_, MappedVector<Block>& blocks_)
+      : allocator(allocator_), blocks(blocks_) {}
 
   /// Does a call; `value` is the data of a new block.
   void Do(const Trace::Event& event, std::uint32_t value) {
@@ -32,10 +33,10 @@ public:
     case Trace::Realloc:
       return Move(block, event.size, value);
     case Trace::Alloc:
-      block = {rival.Alloc(event.size), event.size};
+      block = {allocator.Alloc(event.size), event.size};
       break;
     case Trace::Calloc:
-      block = {rival.Alloc(event.size), event.size};
+      block = {allocator.Alloc(event.size), event.size};
       if (event.size != 0) std::memset(block.p, 0, event.size);
       break;
     }
@@ -51,12 +52,12 @@ public:
 
 private:
   void Drop(Block& block) {
-    sum += GiveBack(rival, block);
+    sum += FreeRecord(allocator, block);
     block = {};
   }
 
   void Move(Block& block, std::uint32_t size, std::uint32_t value) {
-    const Block fresh{rival.Alloc(size), size};
+    const Block fresh{allocator.Alloc(size), size};
     const std::uint32_t held = std::min(size, block.size);
     if (held != 0) std::memcpy(fresh.p, block.p, held);
     Drop(block);
@@ -69,19 +70,19 @@ private:
     Write(block.p, block.size, value);
   }
 
-  Rival& rival;
+  Allocator& allocator;
   MappedVector<Block>& blocks;
   std::uint32_t sum = 0;
 };
 
-/// Takes and frees a large block, as a program that goes on soon does. glibc keeps small freed
-/// blocks apart until then, and gives nothing of them back before.
+/// Allocates and frees a large block, as a program that continues soon does. Until then glibc keeps
+/// small freed blocks apart and returns none of them to the system.
 inline void SettleHeap() {
   void* volatile const p = std::malloc(100'000); // else the compiler sees that it does nothing
   std::free(p);
 }
 
-template <class Rival>
+template <class Allocator>
 class Replay {
 public:
   explicit Replay(const std::string& path) : trace(path), blocks(trace.slots) {}
@@ -97,8 +98,8 @@ public:
 
 private:
   std::uint32_t RunOnce(std::uint32_t value) {
-    Rival rival;
-    Program<Rival, false> program(rival, blocks);
+    Allocator allocator;
+    Program<Allocator, false> program(allocator, blocks);
     for (const Trace::Event& event : trace.events)
       program.Do(event, value++);
     return program.End();

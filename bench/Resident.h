@@ -1,5 +1,5 @@
-// The questions of memory: by how much the resident part of a process grows for a payload that is
-// written whole, and how much of that is left when all is freed.
+// The memory workloads: how much the resident set of a process grows for a payload that is written
+// whole, and how much of that growth is left when all is freed.
 #ifndef VOK_BENCH_RESIDENT_H
 #define VOK_BENCH_RESIDENT_H
 
@@ -23,7 +23,7 @@ namespace Bench {
 struct Growth {
   std::uint64_t payload;
   std::int64_t grown; ///< bytes with the whole payload live
-  std::int64_t left;  ///< bytes with all of it given back
+  std::int64_t left;  ///< bytes with all of it freed
   std::uint32_t sum;
 };
 
@@ -38,32 +38,32 @@ inline std::int64_t ResidentBytes() {
   return std::strtoll(second, nullptr, 10) * sysconf(_SC_PAGESIZE);
 }
 
-/// A million records of one size, given back in the order of taking.
-template <class Rival>
+/// Allocates a million records of one size and frees them in the same order.
+template <class Allocator>
 Growth GrowthOfRecords(std::uint32_t size) {
-  MappedVector<void*> taken(1'000'000); // its zeroes make it resident
+  MappedVector<void*> records(1'000'000); // its zeroes make it resident
   const std::int64_t before = ResidentBytes();
-  Rival rival;
-  for (void*& p : taken) {
-    p = rival.Alloc(size);
+  Allocator allocator;
+  for (void*& p : records) {
+    p = allocator.Alloc(size);
     std::memset(p, 1, size);
   }
-  Growth growth{std::uint64_t{size} * taken.size(), ResidentBytes() - before, 0, 0};
-  for (void* const p : taken)
-    growth.sum += GiveBack(rival, {p, size});
+  Growth growth{std::uint64_t{size} * records.size(), ResidentBytes() - before, 0, 0};
+  for (void* const p : records)
+    growth.sum += FreeRecord(allocator, {p, size});
   SettleHeap();
   growth.left = ResidentBytes() - before;
   return growth;
 }
 
-/// A recorded program at its peak of payload, and behind its end.
-template <class Rival>
+/// Runs a recorded program; the peak of its payload gives the growth.
+template <class Allocator>
 Growth GrowthOfReplay(const std::string& path) {
   const Trace trace(path);
   MappedVector<Block> blocks(trace.slots);
   const std::int64_t before = ResidentBytes();
-  Rival rival;
-  Program<Rival, true> program(rival, blocks);
+  Allocator allocator;
+  Program<Allocator, true> program(allocator, blocks);
   Growth growth{trace.payload, 0, 0, 0};
   for (std::size_t i = 0; i < trace.events.size(); ++i) {
     program.Do(trace.events[i], static_cast<std::uint32_t>(i));

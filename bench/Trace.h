@@ -1,4 +1,4 @@
-// A recorded program: its heap calls, with the slot of each block worked out ahead.
+// A recorded program: its heap calls, with the slot of each block computed in advance.
 #ifndef VOK_BENCH_TRACE_H
 #define VOK_BENCH_TRACE_H
 
@@ -12,7 +12,7 @@
 
 namespace Bench {
 
-/// bench/traces/README.md tells the form of the file.
+/// bench/traces/README.md documents the file format.
 struct Trace {
   enum Call : std::uint32_t { Alloc = 0, Free = 1, Realloc = 2, Calloc = 3 };
 
@@ -23,7 +23,7 @@ struct Trace {
   };
 
   MappedVector<Event> events;
-  std::uint32_t slots = 0;   ///< so many blocks live at once, at most
+  std::uint32_t slots = 0;   ///< the largest number of live blocks
   std::size_t peak = 0;      ///< the number of events up to the largest payload
   std::uint64_t payload = 0; ///< the bytes of all live blocks then
 

@@ -1,5 +1,5 @@
-// The contender of boost::pool.
-#include "Contender.h"
-#include "rivals/BoostPool.h"
+// The benchmark program of boost::pool.
+#include "Harness.h"
+#include "competitors/BoostPool.h"
 
 int main(int argc, char** argv) { return Bench::Main<Bench::BoostPool>(argc, argv); }

@@ -1,5 +1,5 @@
-// The fast path of a request alone: one pair of Alloc and Free, one record in turn, over a live
-// pool of 4,000 records under the default settings.
+// The fast path of a request alone: pairs of Alloc and Free of one record, over 4,000 live records
+// under the default settings.
 //   pair/N   N pairs; scripts/count-instructions takes the difference of two N
 #include <MemPool>
 

@@ -1,5 +1,5 @@
-// The contender of the general heap.
-#include "rivals/Heap.h"
-#include "Contender.h"
+// The benchmark program of the general heap.
+#include "competitors/Heap.h"
+#include "Harness.h"
 
 int main(int argc, char** argv) { return Bench::Main<Bench::Heap>(argc, argv); }

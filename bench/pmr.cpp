@@ -1,5 +1,5 @@
-// The contender of std::pmr::unsynchronized_pool_resource.
-#include "Contender.h"
-#include "rivals/PmrPool.h"
+// The benchmark program of std::pmr::unsynchronized_pool_resource.
+#include "Harness.h"
+#include "competitors/PmrPool.h"
 
 int main(int argc, char** argv) { return Bench::Main<Bench::PmrPool>(argc, argv); }

@@ -1,5 +1,6 @@
-// What a report costs, beside what it can't do without: one pass over the headers of all records,
-// and as many flushed lines of the same length. All write to a file; each figure is a median.
+// What a report costs, compared with its two unavoidable parts: one pass over the headers of all
+// records, and as many flushed lines of the same length. All write to a file; each figure is a
+// median.
 //   plain      Mgr::Dbg of a pool of 1,000,000 used records of 24 bytes
 //   headers    one read of each record's type byte, in the order of addresses
 //   lines      the report's own lines, written and flushed one by one

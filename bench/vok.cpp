@@ -1,5 +1,5 @@
-// The contender of this library.
-#include "Contender.h"
-#include "rivals/VokPool.h"
+// The benchmark program of this library.
+#include "Harness.h"
+#include "competitors/VokPool.h"
 
 int main(int argc, char** argv) { return Bench::Main<Bench::VokPool>(argc, argv); }

@@ -1,4 +1,4 @@
-// Named pools: a name leads to its pool from anywhere in the process, and all pools can be listed.
+// Named pools: code anywhere in the process finds a pool by its name, and can list all pools.
 #include <MemPool>
 
 #include <iostream>
@@ -8,10 +8,10 @@ using namespace VOK::MemPool;
 
 namespace {
 
-// Any library of the process can ask so, and needs no more than the name.
+// Any library of the process can look a pool up; the name is all that it needs.
 void Look(const char* name) {
   const Mgr* const pool = GetMgr(name);
-  std::cout << name << (pool != nullptr ? " stands\n" : " doesn't stand\n");
+  std::cout << name << (pool != nullptr ? " exists\n" : " doesn't exist\n");
 }
 
 void List() {
@@ -29,12 +29,12 @@ int main() {
   ZOR_VOK_MEMPOOL_ON(true);
   Mgr words("words");
   {
-    Mgr lines("Lines"); // a name stands once: a second pool of it would end the process
-    Mgr unnamed;        // gets a running name
+    Mgr lines("Lines"); // names are unique: a second pool "Lines" would end the process
+    Mgr unnamed;        // gets an automatic name
     List();
     Look("Lines");
     Look("lines");
-  } // a pool goes with its handle, and its name is free again
+  } // the handles destroy their pools, and the names are free again
   List();
   Look("Lines");
 }

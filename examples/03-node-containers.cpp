@@ -1,5 +1,5 @@
-// Node containers: the adaptors put standard containers and smart pointers into pools, and keep
-// every alignment. C++17.
+// Node containers: the adaptors put standard containers and smart pointers into pools, with every
+// alignment that a type needs. C++17.
 #include <MemPoolAllocator>
 
 #include <functional>
@@ -28,7 +28,7 @@ struct Circle : Shape {
   const char* Name() const override { return "circle"; }
 };
 
-// The class's own new and delete serve from the pool "bolts", which the first use makes.
+// The class's own new and delete use the pool "bolts", which its first use constructs.
 struct Bolts {
   static constexpr const char* name = "bolts";
 };
@@ -53,11 +53,11 @@ int main() {
             << squareRoots.size() + queue.size() << " nodes, first root "
             << squareRoots.begin()->second << ", first in queue " << queue.front() << '\n';
 
-  // A unique pointer goes back to its pool, through a pointer to the base too.
+  // A unique pointer frees its object in the pool, also through a pointer to the base.
   std::unique_ptr<Shape, Deleter<Shape>> shape = MakeUnique<Circle>(shapes);
   std::cout << "in " << shape.get_deleter().Pool().GetName() << ": a " << shape->Name() << '\n';
 
-  // A memory resource reaches through containers within containers.
+  // A container passes its memory resource on to the containers in it.
   Resource resource(nodes);
   std::pmr::map<std::pmr::string, std::pmr::list<int>> places(&resource);
   places["a word too long to be kept in the string"] = {1, 2, 3};

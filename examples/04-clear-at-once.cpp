@@ -1,5 +1,4 @@
-// Clear at once: what belongs to one piece of work goes in one call, with no Free and no
-// destructor.
+// Clear at once: one call frees all memory of one piece of work, with no Free and no destructor.
 #include <MemPoolAllocator>
 
 #include <iostream>
@@ -15,7 +14,7 @@ namespace {
 using Text = std::basic_string<char, std::char_traits<char>, Allocator<char>>;
 using Words = std::list<Text, Allocator<Text>>;
 
-/// Lays the words of a message into the pool, the list itself too: nobody else owns any of it.
+/// Allocates the words of a message in the pool, and the list itself too: the pool owns all of it.
 const Words& Parse(const char* message, Mgr& pool) {
   Words& words = *MakeUnique<Words>(pool, pool).release();
   std::istringstream text(message);
@@ -27,11 +26,11 @@ const Words& Parse(const char* message, Mgr& pool) {
 } // namespace
 
 int main() {
-  ZOR_VOK_MEMPOOL_ON(true); // with pooling off, Clear does nothing: the heap knows of no pool
+  ZOR_VOK_MEMPOOL_ON(true); // with pooling off, Clear does nothing: the blocks are the heap's
   Mgr pool("message");
   for (const char* message : {"releases unconditionally", "all records, used or not", "at once"}) {
     const Words& words = Parse(message, pool);
     std::cout << words.size() << " words, the last is " << words.back() << '\n';
-    pool.Clear(); // `words` is gone, and the pool serves on as a new one would
+    pool.Clear(); // `words` is freed, and the pool continues as a new one would
   }
 }

@@ -14,10 +14,10 @@ int main() {
     order = pool.Alloc(20);
   for (int i = 0; i < 4; ++i)
     pool.Alloc(50); // rounded up to 52, two to a bucket
-  pool.Alloc(500);  // no bucket serves so much: an ext record, a heap block of its own
+  pool.Alloc(500);  // larger than any record: an ext record, a heap block of its own
   pool.Free(orders[1]);
 
-  // The first lines sum up: 9 records are used in 4 buckets, and 1 block is large. HISTOGRAM tells
-  // which sizes are in use, BUCKETS how full each one is, FREE BUCKETS which one serves next.
+  // The first lines are a summary: 9 records are used in 4 buckets, and 1 block is large. HISTOGRAM
+  // shows the sizes in use, BUCKETS how full each bucket is, FREE BUCKETS which one serves next.
   pool.Dbg();
 }

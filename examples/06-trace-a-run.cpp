@@ -1,5 +1,6 @@
-// Trace a run: each event of a pool writes a line. docs/messages.md explains them, and the program
-// vokmempool adds them up. With ZOR_VOK_MEMPOOL_TRACE=1 in the environment any program does so.
+// Trace a run: each event of a pool writes a line. docs/messages.md explains the lines, and the
+// program vokmempool summarises them. ZOR_VOK_MEMPOOL_TRACE=1 in the environment traces any
+// program.
 #include <MemPool>
 
 int main() {

@@ -1,5 +1,5 @@
-// A pool for each thread: nothing is locked, so one pool belongs to one thread at a time, and pools
-// are made, listed and destroyed by one thread at a time.
+// A pool for each thread: the library has no locks, so only one thread at a time may use a pool,
+// and only one at a time may construct, list and destroy pools.
 #include <MemPool>
 
 #include <deque>
@@ -12,7 +12,7 @@ using namespace VOK::MemPool;
 namespace {
 
 struct Worker {
-  Mgr pool; // a pool stays where it was built, as the elements of a deque do
+  Mgr pool; // a pool must not move, and a deque doesn't move its elements
   std::vector<void*> records;
   std::thread thread;
 
@@ -28,7 +28,7 @@ struct Worker {
 
 int main() {
   ZOR_VOK_MEMPOOL_ON(true);
-  std::deque<Worker> workers; // all pools are made ahead of the threads
+  std::deque<Worker> workers; // all pools exist before the threads start
   for (const char* name : {"north", "south"})
     workers.emplace_back(name);
   for (Worker& worker : workers)
@@ -36,11 +36,11 @@ int main() {
   for (Worker& worker : workers)
     worker.thread.join();
 
-  // Behind the join, the pools are this thread's.
+  // After the join, this thread may use the pools.
   for (Worker& worker : workers) {
-    unsigned taken = 0;
+    unsigned freed = 0;
     for (void* record : worker.records)
-      if (worker.pool.Free(record)) ++taken;
-    std::cout << worker.pool.GetName() << ": " << taken << " records taken back\n";
+      if (worker.pool.Free(record)) ++freed;
+    std::cout << worker.pool.GetName() << ": " << freed << " records freed\n";
   }
 }

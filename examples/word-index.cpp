@@ -1,5 +1,5 @@
-// word-index: on which lines of some texts does a word stand? The index is a map of words, each
-// with the list of its places. Nodes, words and places lie in a named pool each.
+// word-index: on which lines of some texts does a word occur? The index maps each word to the list
+// of its places. Nodes, words and places each have a named pool.
 #include <CLI/CLI.hpp>
 #include <MemPoolAllocator>
 
@@ -30,9 +30,9 @@ struct Place {
   bool operator==(const Place&) const = default;
 };
 
-// A string would keep a short word in itself, and not in its pool.
+// A string would store a short word in itself and not in its pool.
 using Word = std::vector<char, Allocator<char>>;
-using Places = std::forward_list<Place, Allocator<Place>>; // the last one read stands first
+using Places = std::forward_list<Place, Allocator<Place>>; // the one read last is first
 
 struct ByText {
   using is_transparent = void;
@@ -50,7 +50,7 @@ public:
 
   const Tree& Words() const { return *tree; }
 
-  /// Notes a place of `word`; twice on a line is one place.
+  /// Adds a place of `word`; two occurrences on a line are one place.
   void Add(std::string_view word, const Place& place) {
     auto node = tree->find(word);
     if (node == tree->end())
@@ -61,7 +61,7 @@ public:
     ++numPlaces;
   }
 
-  /// Gives back the places in a file, and each word left without a place.
+  /// Erases the places in a file, and each word left without a place.
   void Drop(std::uint32_t file) {
     for (auto node = tree->begin(); node != tree->end();) {
       Places& places = node->second;
@@ -70,8 +70,8 @@ public:
     }
   }
 
-  /// Gives back everything: the heap record by record, pools at once. The map lies in a pool itself
-  /// and goes with all that it holds, no destructor run.
+  /// Frees everything: on the heap record by record, in pools at once. The map itself is in a pool,
+  /// which frees it and all its elements without a destructor.
   void Clear() {
     if (nodes.IsEnabled()) static_cast<void>(tree.release());
     for (Mgr* const pool : {&nodes, &words, &postings})
@@ -93,7 +93,7 @@ struct Options {
   bool heap = false, report = false, detailed = false;
 };
 
-/// The licence texts of the system, without the links, which lead to others of them.
+/// The licence texts of the system, without the links, which point to other texts of the folder.
 std::vector<std::string> Licences() {
   std::set<std::string> files;
   for (const auto& entry : std::filesystem::directory_iterator("/usr/share/common-licenses"))
@@ -131,7 +131,7 @@ void Timed(const char* step, Work work) {
   std::cout << "seconds to " << step << ": " << std::to_string(time.count()) << '\n';
 }
 
-/// Prints for each word how many places it has, and the first three.
+/// Prints how many places each word has, and the first three of them.
 void Answer(const WordIndex& index, const std::vector<std::string>& words, const char* when,
             const std::vector<std::string>& names) {
   for (std::string word : words) {
@@ -149,7 +149,7 @@ void Answer(const WordIndex& index, const std::vector<std::string>& words, const
   }
 }
 
-/// Prints what a pool knows of a record by nothing but its address.
+/// Prints what a pool reports of a record, given nothing but its address.
 void PrintRecord(const char* what, const char* pool, const void* record) {
   const Mgr& mgr = *VOK::MemPool::GetMgr(pool);
   std::cout << what << " in pool " << pool << ": GetSize " << mgr.GetSize(record) << ", Contains "
@@ -165,7 +165,7 @@ void Run(Options options) {
   const auto place = options.drop.empty() ? names.begin() : std::ranges::find(names, options.drop);
   if (place == names.end()) throw std::runtime_error("no file to drop: " + options.drop);
   const auto dropped = static_cast<std::uint32_t>(place - names.begin());
-  VOK::MemPool::ZOR_VOK_MEMPOOL_OFF(options.heap); // counts for the pools to come
+  VOK::MemPool::ZOR_VOK_MEMPOOL_OFF(options.heap); // applies to pools constructed from here on
   WordIndex index;
   std::uint64_t bytes = 0;
   Timed("build", [&] {
@@ -181,8 +181,8 @@ void Run(Options options) {
             << '\n';
   Answer(index, options.queries, " after drop", names);
   if (!index.Words().empty()) {
-    // The one pointer of an adaptor here that its pool knows: what is aligned to more than 4 may be
-    // entered behind the start of its record.
+    // Of the adaptors' pointers here, the pool recognises only this one: an object aligned to more
+    // than 4 may begin after the start of its record.
     const char* const text = index.Words().begin()->first.data();
     PrintRecord("a word", "words", text);
     PrintRecord("a word", "nodes", text);
@@ -202,7 +202,8 @@ int main(int argc, char** argv) {
   CLI::App app("Indexes the words of texts, by default of the system's licence texts.");
   app.add_option("FILE", options.files, "a text to read");
   app.add_option("--query", options.queries, "a word to look up")->allow_extra_args(false);
-  app.add_option("--drop", options.drop, "the file whose places go, by default the first one");
+  app.add_option("--drop", options.drop,
+                 "the file whose places are dropped, by default the first one");
   app.add_option("--repeat", options.repeat, "how often to read")->check(CLI::Range(1, 9999));
   app.add_flag("--heap", options.heap, "run on the general heap");
   app.add_flag("--report", options.report, "print the pools' reports before they are cleared");

@@ -1,6 +1,6 @@
 // This library, one pool under the settings of the environment.
-#ifndef VOK_BENCH_RIVALS_VOKPOOL_H
-#define VOK_BENCH_RIVALS_VOKPOOL_H
+#ifndef VOK_BENCH_COMPETITORS_VOKPOOL_H
+#define VOK_BENCH_COMPETITORS_VOKPOOL_H
 
 #include <MemPool>
 
@@ -24,11 +24,12 @@ public:
   void Clear() { mgr.Clear(); }
   void Reset() { mgr.Reset(); }
 
-  /// A block aligned to 8, under the default settings. At 8-byte pointers a bucket's first data
-  /// lies 52 bytes into its heap block. Where the stride is a multiple of 8, all its data is 4 off
-  /// such a multiple, so asking for 4 bytes more and stepping over them does: 4 bytes a record, 8
-  /// with the record's header. Above the largest record the data lies 24 bytes into a block of its
-  /// own, and nothing is to do. REQUIRES: `size` is a multiple of 8.
+  /// A block aligned to 8, under the default settings. With 8-byte pointers a bucket's first data
+  /// lies 52 bytes into its heap block. Where the stride is a multiple of 8, all data of the bucket
+  /// is 4 off a multiple of 8. So a request of 4 bytes more whose first 4 bytes are skipped is
+  /// aligned; it costs 4 bytes per record, 8 with the record's header. A block above the largest
+  /// record has its data 24 bytes into a heap block, which is aligned already. REQUIRES: `size` is
+  /// a multiple of 8.
   void* AllocAligned8(std::uint32_t size) {
     assert(size % 8 == 0);
     void* p = mgr.Alloc(size > largest ? size : size + shift);

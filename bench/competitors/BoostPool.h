@@ -1,9 +1,9 @@
 // One boost::pool for each multiple of 8 up to 1,000 bytes, about the span that the library serves
 // from buckets; the heap above.
-#ifndef VOK_BENCH_RIVALS_BOOSTPOOL_H
-#define VOK_BENCH_RIVALS_BOOSTPOOL_H
+#ifndef VOK_BENCH_COMPETITORS_BOOSTPOOL_H
+#define VOK_BENCH_COMPETITORS_BOOSTPOOL_H
 
-#include "rivals/Heap.h"
+#include "competitors/Heap.h"
 
 #include <boost/pool/pool.hpp>
 

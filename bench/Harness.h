@@ -1,25 +1,23 @@
-// A contender: the program of one allocator, which stands ready with a workload and works on
-// demand.
-//   lifo/SIZE/DEPTH          DEPTH records taken, given back in reverse, over 4,000 live ones
-//   single/SIZE              one record taken and given back, nothing else live
-//   bulk/SIZE/COUNT/ORDER    COUNT records taken, given back in order, reverse or random
-//   churn/LIVE               one of LIVE records of realistic sizes replaced
+// The main program of an allocator under test: it sets a workload up and runs it on demand.
+//   lifo/SIZE/DEPTH          allocates DEPTH records over 4,000 live ones, frees them in reverse
+//   single/SIZE              allocates and frees one record, with nothing else live
+//   bulk/SIZE/COUNT/ORDER    allocates COUNT records and frees them in order, reverse or random
+//   churn/LIVE               replaces one of LIVE records of realistic sizes
 //   mixed/LIVE               the same with 2 % of 1 to 64 KiB
-//   nodes/map, list, umap    1,000 entries put in, looked at and taken out
-//   clear/SIZE/COUNT         COUNT records built and all released at once
+//   nodes/map, list, umap    inserts, looks up and erases 1,000 entries
+//   clear/SIZE/COUNT         builds COUNT records and frees all of them at once
 //   reset/SIZE/COUNT         the same by Reset; an allocator without it frees each
 //   threads/COUNT            churn/2000 in COUNT threads, each with a pool of its own
-//   replay/NAME TRACE        a recorded program, again and again in one process, with its pool's
-//   making
-//                            and end
+//   replay/NAME TRACE        a recorded program, again and again in one process, its pool
+//                            constructed and destroyed each time
 //   fresh/NAME TRACE         the same, to be done once
 //   resident/SIZE            memory: a million records
 //   resident/NAME TRACE      memory: a recorded program at its peak
-// It says "ready", and answers each "go N" with the nanoseconds of N times and a checksum:
-// processor time, except for threads. A question of memory is answered at once: payload, grown,
+// It writes "ready", and answers each "go N" with the nanoseconds of N runs and a checksum:
+// processor time, except for threads. A memory workload writes its answer at once: payload, grown,
 // left, checksum.
-#ifndef VOK_BENCH_CONTENDER_H
-#define VOK_BENCH_CONTENDER_H
+#ifndef VOK_BENCH_HARNESS_H
+#define VOK_BENCH_HARNESS_H
 
 #include "Nodes.h"
 #include "Records.h"
@@ -61,7 +59,7 @@ inline void Answer(const Growth& growth) {
             << std::endl;
 }
 
-/// The words of a workload's name, with its trace behind them.
+/// The words of a workload's name, followed by its trace.
 class Request {
 public:
   explicit Request(const std::vector<std::string>& arguments) {
@@ -84,48 +82,49 @@ private:
 };
 
 /// False if there is no such workload.
-template <class Rival>
-bool Contend(const Request& ask) {
+template <class Allocator>
+bool RunWorkload(const Request& ask) {
   constexpr std::uint32_t live = 4000;
   constexpr std::uint32_t large = 20;
   if (ask.Is("lifo", 3))
-    Serve(Lifo<Rival>(ask.Number(1), ask.Number(2), live));
+    Serve(Lifo<Allocator>(ask.Number(1), ask.Number(2), live));
   else if (ask.Is("single", 2))
-    Serve(Lifo<Rival>(ask.Number(1), 1, 0));
+    Serve(Lifo<Allocator>(ask.Number(1), 1, 0));
   else if (ask.Is("bulk", 4))
-    Serve(Bulk<Rival>(ask.Number(1), ask.Number(2), ask.Text(3)));
+    Serve(Bulk<Allocator>(ask.Number(1), ask.Number(2), ask.Text(3)));
   else if (ask.Is("churn", 2))
-    Serve(Churn<Rival>(ask.Number(1), 0));
+    Serve(Churn<Allocator>(ask.Number(1), 0));
   else if (ask.Is("mixed", 2))
-    Serve(Churn<Rival>(ask.Number(1), large));
+    Serve(Churn<Allocator>(ask.Number(1), large));
   else if (ask.Is("nodes", 2) && ask.Text(1) == "map")
-    Serve(TreeNodes<Rival>());
+    Serve(TreeNodes<Allocator>());
   else if (ask.Is("nodes", 2) && ask.Text(1) == "list")
-    Serve(ListNodes<Rival>());
+    Serve(ListNodes<Allocator>());
   else if (ask.Is("nodes", 2) && ask.Text(1) == "umap")
-    Serve(HashNodes<Rival>());
+    Serve(HashNodes<Allocator>());
   else if (ask.Is("clear", 3))
-    Serve(Drop<Rival>(ask.Number(1), ask.Number(2), false));
+    Serve(Drop<Allocator>(ask.Number(1), ask.Number(2), false));
   else if (ask.Is("reset", 3))
-    Serve(Drop<Rival>(ask.Number(1), ask.Number(2), true));
+    Serve(Drop<Allocator>(ask.Number(1), ask.Number(2), true));
   else if (ask.Is("threads", 2))
-    Serve(Threads<Rival>(ask.Number(1), 2000), CLOCK_MONOTONIC);
+    Serve(Threads<Allocator>(ask.Number(1), 2000), CLOCK_MONOTONIC);
   else if (ask.Is("replay", 3) || ask.Is("fresh", 3))
-    Serve(Replay<Rival>(ask.Text(2)));
+    Serve(Replay<Allocator>(ask.Text(2)));
   else if (ask.Is("resident", 2))
-    Answer(GrowthOfRecords<Rival>(ask.Number(1)));
+    Answer(GrowthOfRecords<Allocator>(ask.Number(1)));
   else if (ask.Is("resident", 3))
-    Answer(GrowthOfReplay<Rival>(ask.Text(2)));
+    Answer(GrowthOfReplay<Allocator>(ask.Text(2)));
   else
     return false;
   return true;
 }
 
-template <class Rival>
+template <class Allocator>
 int Main(int argc, char** argv) {
   try {
-    if ((argc == 2 || argc == 3) && Contend<Rival>(Request({argv + 1, argv + argc}))) return 0;
-    std::cerr << "usage: " << argv[0] << " WORKLOAD [TRACE], workloads as in bench/Contender.h\n";
+    if ((argc == 2 || argc == 3) && RunWorkload<Allocator>(Request({argv + 1, argv + argc})))
+      return 0;
+    std::cerr << "usage: " << argv[0] << " WORKLOAD [TRACE], workloads as in bench/Harness.h\n";
     return 2;
   } catch (const std::invalid_argument& error) {
     std::cerr << argv[0] << ": bad number or order in the workload: " << error.what() << '\n';

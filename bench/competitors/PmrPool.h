@@ -1,6 +1,6 @@
 // The standard library's pool for one thread, under its own limits.
-#ifndef VOK_BENCH_RIVALS_PMRPOOL_H
-#define VOK_BENCH_RIVALS_PMRPOOL_H
+#ifndef VOK_BENCH_COMPETITORS_PMRPOOL_H
+#define VOK_BENCH_COMPETITORS_PMRPOOL_H
 
 #include <cstddef>
 #include <cstdint>

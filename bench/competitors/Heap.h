@@ -1,6 +1,6 @@
 // The general heap: glibc's, or the one that LD_PRELOAD puts in its place.
-#ifndef VOK_BENCH_RIVALS_HEAP_H
-#define VOK_BENCH_RIVALS_HEAP_H
+#ifndef VOK_BENCH_COMPETITORS_HEAP_H
+#define VOK_BENCH_COMPETITORS_HEAP_H
 
 #include <cstddef>
 #include <cstdint>
