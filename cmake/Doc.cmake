@@ -1,5 +1,5 @@
 # The target doc: the public headers and the documents as pages to browse, in build/<preset>/doc/html.
-# A reference that leads nowhere and a parameter that isn't told fail it.
+# A reference that leads nowhere and a parameter that isn't documented fail it.
 find_package(Doxygen QUIET)
 if(NOT DOXYGEN_FOUND)
   message(STATUS "No target doc: Doxygen is not installed")
