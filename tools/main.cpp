@@ -1,8 +1,8 @@
 // vokmempool: reads what pools print. Exit status 0: done; 1: a failure, told in one line on the
 // error stream; 2: bad arguments.
-#include "Commands.h"
-#include "Failure.h"
-#include "Files.h"
+#include "common/Commands.h"
+#include "common/Failure.h"
+#include "common/Files.h"
 
 #include <CLI/CLI.hpp>
 #include <csignal>

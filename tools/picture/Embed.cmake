@@ -28,7 +28,7 @@ string(SUBSTRING "${page}" 0 ${begin} start)
 string(SUBSTRING "${page}" ${end} -1 rest)
 
 file(WRITE ${OUTPUT} "// Made from ${PAGE}.
-#include \"PicturePage.h\"
+#include \"picture/Page.h\"
 
 namespace VOK::MemPool::Tools {
 
