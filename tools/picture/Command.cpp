@@ -4,8 +4,7 @@
 #include "common/Failure.h"
 #include "common/Files.h"
 #include "picture/Data.h"
-#include "picture/Page.h"
-#include "report/File.h"
+#include "report/Reader.h"
 
 #include <CLI/CLI.hpp>
 #include <filesystem>

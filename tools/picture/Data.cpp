@@ -1,14 +1,17 @@
 #include "picture/Data.h"
 
-#include "picture/Match.h"
 #include "picture/RecordBits.h"
 #include "report/Check.h"
 #include "report/Form.h"
 #include "report/Summary.h"
 
 #include <algorithm>
+#include <deque>
 #include <fmt/format.h>
+#include <map>
 #include <nlohmann/json.hpp>
+#include <optional>
+#include <set>
 #include <utility>
 
 namespace VOK::MemPool::Tools {
@@ -17,6 +20,39 @@ namespace {
 
 using Json = nlohmann::ordered_json;
 
+/// An item of an earlier and of a later report; it came or went if one of them lacks it.
+template <class Item>
+struct Pair {
+  const Item* before = nullptr;
+  const Item* now = nullptr;
+
+  const Item& Get() const { return now != nullptr ? *now : *before; }
+  const char* Change() const { return before == nullptr ? "came" : now == nullptr ? "went" : ""; }
+};
+
+/// The items of `now` in their order, each with the one of `before` that has the same key, and then
+/// the rest of `before`. Of equal keys the first belongs to the first.
+template <class Item, class KeyOf>
+std::vector<Pair<Item>> Match(const std::vector<Item>& before, const std::vector<Item>& now,
+                              KeyOf keyOf) {
+  std::map<decltype(keyOf(now.front())), std::deque<const Item*>> byKey;
+  for (const Item& item : before)
+    byKey[keyOf(item)].push_back(&item);
+  std::set<const Item*> matched;
+  std::vector<Pair<Item>> pairs;
+  for (const Item& item : now) {
+    pairs.push_back({nullptr, &item});
+    const auto found = byKey.find(keyOf(item));
+    if (found == byKey.end() || found->second.empty()) continue;
+    pairs.back().before = found->second.front();
+    matched.insert(found->second.front());
+    found->second.pop_front();
+  }
+  for (const Item& item : before)
+    if (!matched.contains(&item)) pairs.push_back({&item, nullptr});
+  return pairs;
+}
+
 std::string HexOf(Address address) { return fmt::format("{:x}", address.value); }
 
 const Report& OrNone(const Report* report) {
@@ -24,7 +60,7 @@ const Report& OrNone(const Report* report) {
   return report != nullptr ? *report : none;
 }
 
-/// The header block, as label and value.
+/// Visits a header block for its labels and values.
 struct HeaderLines {
   Json lines = Json::array();
 
@@ -39,14 +75,14 @@ private:
   }
 };
 
-/// The breaches of a report, and the records that they are about.
+/// The inconsistencies of a report, and the records that they are about.
 class Faults {
 public:
-  explicit Faults(const Report& report_) : report(report_), flags(report.bucketReports.size()) {
-    for (std::size_t i = 0; i < flags.size(); ++i)
-      FlagTypes(i);
-    for (const Breach& breach : CheckReport(report))
-      Take(breach);
+  explicit Faults(const Report& report) {
+    for (const BucketReport& bucket : report.bucketReports)
+      flags.emplace_back(bucket.records.rows.size());
+    for (const Inconsistency& inconsistency : CheckReport(report))
+      Take(inconsistency);
   }
 
   /// A flag for each damaged record, nothing if there is none.
@@ -61,41 +97,18 @@ public:
 private:
   static constexpr std::size_t most = 500; // a page isn't there to list more
 
-  void FlagTypes(std::size_t i) {
-    for (const RecordRow& row : report.bucketReports[i].records.rows)
-      flags[i].push_back(row.type == Type::Ext || row.type == Type::Unknown);
+  void Take(const Inconsistency& inconsistency) {
+    const auto& [line, bucket, record] = inconsistency.place;
+    if (record) flags[*bucket][*record] = true;
+    if (++count <= most)
+      list.push_back({line, IndexOrNull(bucket), IndexOrNull(record), inconsistency.text});
   }
 
-  void Take(const Breach& breach) {
-    const auto& buckets = report.bucketReports;
-    const auto behind =
-        std::upper_bound(buckets.begin(), buckets.end(), breach.line,
-                         [](std::size_t line, const BucketReport& b) { return line < b.line; });
-    Json bucket;
-    Json record;
-    if (behind != buckets.begin()) {
-      const auto i = static_cast<std::size_t>(behind - buckets.begin()) - 1;
-      bucket = i;
-      const std::size_t damaged = RecordAt(buckets[i], breach.line);
-      if (damaged < flags[i].size()) {
-        record = damaged;
-        flags[i][damaged] = true;
-      }
-    }
-    if (++count <= most) list.push_back({breach.line, bucket, record, breach.text});
+  static Json IndexOrNull(const std::optional<std::size_t>& index) {
+    return index ? Json(*index) : Json();
   }
 
-  /// The record of a line in ALL RECORDS or FREE LIST, a number beyond all records for another.
-  static std::size_t RecordAt(const BucketReport& bucket, std::size_t line) {
-    const std::size_t row = line - bucket.records.LineOf(0);
-    if (row < bucket.records.rows.size()) return row;
-    const std::size_t free = line - bucket.freeList.LineOf(0);
-    if (free >= bucket.freeList.rows.size() || bucket.recSize == 0) return SIZE_MAX;
-    return (bucket.freeList.rows[free].offset - std::size_t{2}) / bucket.recSize;
-  }
-
-  const Report& report;
-  std::vector<std::vector<bool>> flags; ///< by bucket
+  std::vector<std::vector<bool>> flags; ///< by bucket and record
 };
 
 std::vector<bool> UsedIn(const BucketReport& bucket) {
@@ -176,6 +189,7 @@ public:
                  {"change", isPair ? pair.Change() : ""},
                  {"used", report.usedRecs},
                  {"free", report.freeRecs},
+                 {"off", report.IsOff()},
                  {"held", bytes.held},
                  {"payload", bytes.payload},
                  {"sizeofBucket", report.sizeofBucket},

@@ -4,8 +4,8 @@
 #include "common/Failure.h"
 #include "common/Files.h"
 #include "report/Check.h"
-#include "report/File.h"
 #include "report/Json.h"
+#include "report/Reader.h"
 #include "report/Summary.h"
 #include "report/Writer.h"
 
@@ -25,11 +25,12 @@ struct Options {
 void Check(const std::vector<Report>& reports, const std::string& file) {
   std::size_t count = 0;
   for (const Report& report : reports)
-    for (const Breach& breach : CheckReport(report)) {
-      Print(fmt::format("line {}: {}\n", breach.line, breach.text));
+    for (const Inconsistency& inconsistency : CheckReport(report)) {
+      Print(fmt::format("line {}: {}\n", inconsistency.place.line, inconsistency.text));
       ++count;
     }
-  if (count > 0) throw Failure(fmt::format("{}: {} breach{}", file, count, count == 1 ? "" : "es"));
+  if (count > 0)
+    throw Failure(fmt::format("{}: {} inconsistenc{}", file, count, count == 1 ? "y" : "ies"));
 }
 
 void Run(const Options& options) {
@@ -56,10 +57,10 @@ void AddReport(CLI::App& app) {
   CLI::Option_group* const form = command->add_option_group("Form");
   form->add_flag("--summary", options->summary, "a table of the pools (if no other form is named)");
   form->add_flag("--json", options->json, "a JSON document of all that the reports say");
-  form->add_flag("--check", options->check, "each contradiction in a report, with its line");
+  form->add_flag("--check", options->check, "each inconsistency in a report, with its line");
   form->add_flag("--text", options->text, "the reports alone, as the library prints them");
   form->require_option(0, 1);
-  command->footer("Example: is the pool's state sound after this run?\n"
+  command->footer("Example: is the pool's state consistent after this run?\n"
                   "  ./program | vokmempool report --check");
   command->callback([options] { Run(*options); });
 }

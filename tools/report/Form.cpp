@@ -1,8 +1,62 @@
-#include "report/FixedLines.h"
+#include "report/Form.h"
 
 #include <fmt/format.h>
 
 namespace VOK::MemPool::Tools {
+
+namespace {
+
+/// Visits a header block for the line of a label, and for the line after the block.
+struct LineFinder {
+  std::string_view label;
+  std::size_t next; ///< at first the line after the title
+  std::size_t found = 0;
+
+  template <class Value>
+  void Line(const char* text, const char*, const Value&) {
+    if (text == label) found = next;
+    ++next;
+  }
+};
+
+template <class Block>
+LineFinder Find(const Block& block, std::size_t title, std::string_view label) {
+  LineFinder finder{label, title + 1};
+  VisitLines(block, finder);
+  return finder;
+}
+
+// A section follows an empty line, of which `line` is the number, and the number of the line after
+// it is returned.
+
+template <class Row>
+std::size_t NumberTable(Table<Row>& table, std::size_t line) {
+  table.line = line + 1;
+  return table.LineOf(table.rows.size());
+}
+
+template <class Row>
+std::size_t NumberTable(Table<Row>& table, const std::optional<Warning>& warning,
+                        std::size_t line) {
+  return NumberTable(table, line) + (warning ? 1 : 0);
+}
+
+std::size_t NumberMap(Map& map, std::size_t line) {
+  map.line = line + 1;
+  return map.LineOf(map.labels.size() * Map::boxesPerRow);
+}
+
+std::size_t NumberBucket(BucketReport& bucket, std::size_t line) {
+  bucket.line = line + 1;
+  line = Find(bucket, bucket.line, "").next;
+  line = NumberTable(bucket.records, bucket.recordsWarning, line);
+  line = NumberTable(bucket.histogram, line);
+  line = NumberMap(bucket.map, line);
+  line = NumberTable(bucket.freeList, bucket.freeListWarning, line);
+  return line + 1; // an empty line
+}
+
+} // namespace
 
 std::string HeadingLine(std::span<const Column> columns) {
   std::string line(tableIndent);
@@ -52,6 +106,25 @@ const char* TypeText(Type type) {
     break;
   }
   return TypeName::unknown;
+}
+
+std::size_t LineOf(const Report& report, std::string_view label) {
+  return Find(report, report.TitleEnd(), label).found;
+}
+
+std::size_t LineOf(const BucketReport& bucket, std::string_view label) {
+  return Find(bucket, bucket.line, label).found;
+}
+
+std::size_t NumberLines(Report& report) {
+  std::size_t line = Find(report, report.TitleEnd(), "").next;
+  line = NumberTable(report.histogram, line);
+  line = NumberTable(report.buckets, line);
+  line = NumberTable(report.freeBuckets, line) + 1; // an empty line
+  line = NumberTable(report.extRecs, line) + 1;     // likewise
+  for (BucketReport& bucket : report.bucketReports)
+    line = NumberBucket(bucket, line);
+  return line;
 }
 
 } // namespace VOK::MemPool::Tools

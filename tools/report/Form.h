@@ -1,6 +1,6 @@
-// Which value stands where in a report: one description for the text and for JSON, in both
-// directions. A visitor is called once a value, in the order of the text, with the value's key and,
-// in a header block, its label.
+// The form of a report: which value it shows where, one description for the text and for JSON in
+// both directions; and the lines of the text that hold no value. A visitor is called once per
+// value, in the order of the text, with the value's key and, in a header block, its label.
 #ifndef VOK_MEMPOOL_TOOLS_REPORT_FORM_H
 #define VOK_MEMPOOL_TOOLS_REPORT_FORM_H
 
@@ -8,7 +8,10 @@
 #include "report/Model.h"
 
 #include <concepts>
+#include <cstddef>
 #include <span>
+#include <string>
+#include <string_view>
 #include <type_traits>
 
 namespace VOK::MemPool::Tools {
@@ -70,7 +73,7 @@ void VisitLines(B& bucket, Visitor& visitor) {
   visitor.Line(BucketLabel::headerOffset, "headerOffset", bucket.headerOffset);
 }
 
-// The rows. A Cell has a separator behind it, a LastCell has none.
+// The rows. A separator follows a Cell, but not a LastCell.
 
 template <Is<SizeRow> Row, class Visitor>
 void VisitCells(Row& row, Visitor& visitor) {
@@ -165,6 +168,46 @@ constexpr std::span<const Column> ColumnsOf() {
 /// The most stars that a bar can have: in a pool's histogram twice the width of its column.
 inline constexpr Number maxStars = 100;
 static_assert(maxStars == 2 * PoolColumns::histogram[3].width);
+
+/// The largest whole part of a percentage: all records used where a bucket has room for one.
+inline constexpr std::uint64_t maxPercent = UINT64_C(429496729500);
+
+// Indentations are those of depth 0.
+inline constexpr std::string_view headerIndent = "   ";
+inline constexpr std::string_view titleIndent = "   ";
+inline constexpr std::string_view histogramIndent = "         "; // of the pool's histogram title
+inline constexpr std::string_view tableIndent = "      ";
+inline constexpr std::string_view bucketIndent = "      "; // of a bucket's header block
+
+inline constexpr std::string_view mapMargin = "     | ";
+inline constexpr std::string_view wall = "| ";
+
+/// What a warning begins with; the number of its source line follows in a field of five.
+inline constexpr std::string_view warningStart = "WARNING:../s/MemPool:";
+inline constexpr int warningWidth = 5;
+
+std::string HeadingLine(std::span<const Column> columns);
+std::string RuleLine(std::span<const Column> columns);
+std::string MapHeading(std::size_t columns);
+std::string MapRule(std::size_t boxes);
+
+/// What a bucket's titles begin with.
+std::string BucketMark(Number number);
+
+/// An address as a report shows it: padded on the left to eight characters.
+std::string AddressText(Address address);
+
+const char* TypeText(Type type);
+
+// Line numbers. Those of a header block count from the last line of its title.
+
+/// The line of a label in the block of a pool or of a bucket.
+std::size_t LineOf(const Report& report, std::string_view label);
+std::size_t LineOf(const BucketReport& bucket, std::string_view label);
+
+/// Numbers the lines of a report from that of its title, and returns the number of the line after
+/// it.
+std::size_t NumberLines(Report& report);
 
 } // namespace VOK::MemPool::Tools
 

@@ -1,4 +1,4 @@
-// Reports as a JSON document, and back. docs/report-json.md tells the form.
+// Reports as a JSON document, and back. docs/report-json.md documents the form.
 // Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_REPORT_JSON_H
 #define VOK_MEMPOOL_TOOLS_REPORT_JSON_H
@@ -11,10 +11,10 @@
 
 namespace VOK::MemPool::Tools {
 
-/// What stands behind the key of a text that is no UTF-8: its bytes are under that key.
+/// Ends the second key of a text that is no UTF-8, which has its bytes.
 inline constexpr const char* textBytes = "Bytes";
 
-/// Writes the document in pieces, one a bucket.
+/// Writes the document in pieces, one per bucket.
 void WriteJson(const std::vector<Report>& reports,
                const std::function<void(std::string_view)>& write);
 

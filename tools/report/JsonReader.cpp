@@ -1,9 +1,7 @@
-#include "common/Failure.h"
-#include "report/FixedLines.h"
-#include "report/Form.h"
 #include "report/Json.h"
-#include "report/Reader.h"
-#include "report/Writer.h"
+
+#include "common/Failure.h"
+#include "report/Form.h"
 
 #include <algorithm>
 #include <charconv>
@@ -11,6 +9,7 @@
 #include <fmt/format.h>
 #include <limits>
 #include <nlohmann/json.hpp>
+#include <utility>
 
 namespace VOK::MemPool::Tools {
 
@@ -47,6 +46,10 @@ public:
     text = object.contains(bytes) ? BytesOf(bytes, object.at(bytes).get<std::string>())
                                   : object.at(key).get<std::string>();
   }
+  void GetLine(const std::string& key, std::string& text) const {
+    Get(key, text);
+    if (text.find('\n') != text.npos) Refuse(key, "a text of one line");
+  }
   void Get(const std::string& key, Number& number) const {
     const Json& json = object.at(key);
     if (!json.is_number_unsigned() ||
@@ -75,7 +78,7 @@ public:
   }
   void Get(const std::string& key, Percent& percent) const {
     const double value = object.at(key).get<double>();
-    if (!(value >= 0 && value < 1e12)) Refuse(key, "a percentage");
+    if (!(value >= 0 && value < static_cast<double>(maxPercent) + 1)) Refuse(key, "a percentage");
     percent.thousandths = static_cast<std::uint64_t>(std::llround(value * 1000));
   }
   void Get(const std::string& key, Bar& bar) const {
@@ -84,6 +87,7 @@ public:
     bar.more = IsTrue(object, "more");
   }
 
+  void Line(const char*, const char* key, std::string& text) const { GetLine(key, text); }
   template <class Value>
   void Line(const char*, const char* key, Value& value) const {
     Get(key, value);
@@ -122,7 +126,7 @@ void FromJson(const Json& json, Table<Row>& table, std::optional<Warning>& warni
   const Getter getter(json.at("warning"));
   warning.emplace();
   getter.Get("source", warning->source);
-  getter.Get("text", warning->text);
+  getter.GetLine("text", warning->text);
   getter.Get("count", warning->count);
   getter.Get("total", warning->total);
 }
@@ -174,13 +178,16 @@ void FromJson(const Json& json, Report& report) {
   Getter(json.at("freeBuckets")).Get("freeBucksM", report.freeBucketsM);
   FromJson(json.at("extRecs"), report.extRecs);
   if (!json.at("bucketReports").empty()) Refuse("bucketReports", "an array of objects");
+  const std::size_t count = report.bucketReports.size();
+  if (count > 0 && count < report.buckets.rows.size())
+    Refuse("bucketReports", "empty or an object for each bucket");
 }
 
-/// Takes the reports out of a document while it is parsed, bucket by bucket, and leaves of each
+/// Takes the reports out of a document while it is parsed, bucket by bucket, and leaves in each
 /// array what isn't one: as values of the parser a large report takes many times its own size.
 class Collector {
 public:
-  std::string text; ///< of the reports so far
+  std::vector<Report> reports;
 
   bool Take(int depth, Json::parse_event_t event, const Json& parsed) {
     if (event == Json::parse_event_t::key && depth == 1) isInReports = parsed == "reports";
@@ -192,14 +199,16 @@ public:
     }
     if (depth != 2) return true;
     FromJson(parsed, report);
-    text += WriteReport(report);
-    report = {};
+    report.line = nextLine;
+    nextLine = NumberLines(report);
+    reports.push_back(std::exchange(report, {}));
     return false;
   }
 
 private:
   bool isInReports = false, isInBuckets = false;
-  Report report;
+  Report report; ///< as far as it is read
+  std::size_t nextLine = 1;
 };
 
 } // namespace
@@ -215,7 +224,7 @@ std::vector<Report> ReadJson(std::string_view document) {
   } catch (const Json::exception& error) {
     throw Failure(fmt::format("not a document of reports: {}", error.what()));
   }
-  return ReadReports(collector.text);
+  return std::move(collector.reports);
 }
 
 } // namespace VOK::MemPool::Tools

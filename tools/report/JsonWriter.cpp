@@ -1,6 +1,6 @@
-#include "report/FixedLines.h"
-#include "report/Form.h"
 #include "report/Json.h"
+
+#include "report/Form.h"
 
 #include <fmt/format.h>
 #include <nlohmann/json.hpp>

@@ -1,7 +1,6 @@
 #include "report/Lines.h"
 
 #include "common/Failure.h"
-#include "report/FixedLines.h"
 #include "report/Form.h"
 
 #include <algorithm>
@@ -26,7 +25,7 @@ std::string Quoted(std::string_view text) {
   return quoted + (text.size() > most ? "\"..." : "\"");
 }
 
-/// The digits as the library's stream prints a number: no zero in front, and within range.
+/// The digits as the library's stream prints a number: no leading zero, and within range.
 template <class Unsigned>
 std::optional<Unsigned> ToNumber(std::string_view digits, int base = 10) {
   Unsigned number = 0;
@@ -138,8 +137,8 @@ Percent Fields::TakePercent(int width) {
   const std::size_t point = std::min(text.find('.'), text.size());
   const auto whole = ToNumber<std::uint64_t>(text.substr(0, point));
   const std::string_view decimals = text.substr(std::min(point + 1, text.size()));
-  constexpr std::uint64_t most = UINT64_C(429496729500); // 4294967295 records where one has room
-  if (!whole || *whole > most || decimals.size() != 3 || decimals.find('.') != decimals.npos) {
+  if (!whole || *whole > maxPercent || decimals.size() != 3 ||
+      decimals.find('.') != decimals.npos) {
     at = start;
     Fail(expected);
   }
@@ -187,13 +186,13 @@ Type Fields::TakeLeftType(int width, bool& isHead) {
 }
 
 Id Fields::TakeId(int width) {
-  const std::string expected = fmt::format("a number filled with zeros to {} columns", width);
+  const std::string expected = fmt::format("a number padded with zeros to {} columns", width);
   const std::size_t start = at;
   std::string_view digits = TakeRun(decimal);
-  const bool isFilled = digits.size() == static_cast<std::size_t>(width);
-  if (isFilled) digits.remove_prefix(std::min(digits.find_first_not_of('0'), digits.size() - 1));
+  const bool isPadded = digits.size() == static_cast<std::size_t>(width);
+  if (isPadded) digits.remove_prefix(std::min(digits.find_first_not_of('0'), digits.size() - 1));
   const auto number = ToNumber<Number>(digits);
-  if (!number || (!isFilled && digits.size() < static_cast<std::size_t>(width))) {
+  if (!number || (!isPadded && digits.size() < static_cast<std::size_t>(width))) {
     at = start;
     Fail(expected);
   }
@@ -216,11 +215,11 @@ Bar Fields::TakeBar() {
 std::string_view Fields::TakeField(int width, std::string_view characters,
                                    std::string_view expected) {
   const std::size_t start = at;
-  const std::size_t blanks = TakeRun(" ").size();
+  const std::size_t spaces = TakeRun(" ").size();
   const std::string_view value = TakeRun(characters);
-  const std::size_t length = blanks + value.size();
+  const std::size_t length = spaces + value.size();
   const auto columns = static_cast<std::size_t>(width);
-  if (value.empty() || length < columns || (blanks > 0 && length > columns)) {
+  if (value.empty() || length < columns || (spaces > 0 && length > columns)) {
     at = start;
     Fail(expected);
   }

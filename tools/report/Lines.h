@@ -1,5 +1,5 @@
-// A text line by line, and a line value by value: each taken only in the very form in which a
-// report prints it. What stands there instead is a Failure that names the line.
+// A text line by line, and a line value by value, each accepted only in the exact form in which a
+// report prints it. Anything else is a Failure that names the line.
 #ifndef VOK_MEMPOOL_TOOLS_REPORT_LINES_H
 #define VOK_MEMPOOL_TOOLS_REPORT_LINES_H
 
@@ -14,14 +14,14 @@ namespace VOK::MemPool::Tools {
 /// The lines of a text, of which the last may lack its end.
 class Lines {
 public:
-  bool isCrLf = false; ///< lines end as on Windows, and are shown without that
+  bool isCrLf = false; ///< lines end as on Windows, and are returned without them
 
   explicit Lines(std::string_view text_) : text(text_) {}
 
   bool AtEnd() const { return begin == text.size(); }
   std::size_t GetNumber() const { return number; } ///< of the present line, from 1
 
-  /// The present line, and the one behind it; empty at the end of the text.
+  /// The present line, and the one after it; empty at the end of the text.
   std::string_view Get() const { return LineAt(begin); }
   std::string_view GetSecond() const { return LineAt(EndAt(begin)); }
   bool StartsWith(std::string_view start) const { return Get().starts_with(start); }
@@ -31,7 +31,7 @@ public:
   /// Skips the present line if it is this one, and fails otherwise.
   void SkipExactly(std::string_view line);
 
-  /// Fails unless the present line stands there with its end.
+  /// Fails unless there is a present line, with its line end.
   void CheckWhole(std::string_view expected) const;
 
   [[noreturn]] void Fail(std::string_view expected, std::size_t column = 0) const;
@@ -62,7 +62,7 @@ public:
   std::string_view TakeRest() { return TakeFirst(line.size() - at); }
   void TakeEnd() const;
 
-  /// At the right of a field; a value that is longer stands there whole.
+  /// At the right of a field, which a longer value exceeds.
   Number TakeNumber(int width = 0);
   Address TakeAddress(int width = 0);
   Percent TakePercent(int width);

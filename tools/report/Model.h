@@ -1,8 +1,9 @@
 // A pool's report as data: what its text says, each value once, in the order of the text. Values
-// are kept as they were printed, also where they contradict each other.
+// are kept as they were printed, also where they are inconsistent.
 #ifndef VOK_MEMPOOL_TOOLS_REPORT_MODEL_H
 #define VOK_MEMPOOL_TOOLS_REPORT_MODEL_H
 
+#include <algorithm>
 #include <cstddef>
 #include <cstdint>
 #include <optional>
@@ -20,7 +21,7 @@ struct Address {
   bool operator==(const Address&) const = default;
 };
 
-/// A number that a table fills with zeros.
+/// A number that a table pads with zeros.
 struct Id {
   Number value = 0;
 };
@@ -29,7 +30,7 @@ struct Percent {
   std::uint64_t thousandths = 0;
 };
 
-/// Stars; `more` is the "+" behind them.
+/// Stars; `more` is the "+" after them.
 struct Bar {
   Number stars = 0;
   bool more = false;
@@ -37,8 +38,8 @@ struct Bar {
 
 enum class Type : std::uint8_t { Free, Used, Ext, Unknown };
 
-/// A line that the library writes below a table whose walk went wrong: what it says, and the place
-/// in the library's source that says it.
+/// A line that the library writes below a table whose walk failed, with the line of the library's
+/// source that writes it.
 struct Warning {
   Number source = 0;
   std::string text; ///< up to the count
@@ -46,7 +47,7 @@ struct Warning {
   Number total = 0;
 };
 
-/// A table under its title, in whose brackets `count` stands.
+/// A table under its title, which has `count` in brackets.
 template <class RowType>
 struct Table {
   using Row = RowType;
@@ -55,7 +56,7 @@ struct Table {
   Number count = 0;
   std::vector<Row> rows;
 
-  /// The line of a row: title, heading and rule stand in front.
+  /// The line of a row, which follows title, heading and rule.
   std::size_t LineOf(std::size_t row) const { return line + 3 + row; }
 };
 
@@ -118,14 +119,14 @@ struct Box {
 struct Map {
   std::size_t line = 0; ///< of the title
   Number count = 0;
-  Number columns = 0;         ///< numbers in the heading, and boxes of the rule behind full rows
-  std::vector<Number> labels; ///< one a grid row
+  Number columns = 0;         ///< numbers in the heading, and boxes of the rule after full rows
+  std::vector<Number> labels; ///< one per grid row
   std::vector<Box> boxes;
 
   static constexpr std::size_t boxesPerRow = 8;
 
-  /// The first line of the grid row that holds a box: title, heading and a rule stand in front of
-  /// the first, and a row is four lines and the next rule.
+  /// The first line of the grid row that holds a box. Title, heading and a rule precede the first
+  /// row, and a row is four lines and the next rule.
   std::size_t LineOf(std::size_t box) const { return line + 3 + box / boxesPerRow * 5; }
 };
 
@@ -160,6 +161,13 @@ struct Report {
   Number freeBucketsM = 0; ///< the second number of that table's title
   Table<ExtRow> extRecs;
   std::vector<BucketReport> bucketReports; ///< empty in the plain form
+
+  bool IsOff() const { return enabled == 0; }
+
+  /// The last line of the title, which has more than one if the name has line ends.
+  std::size_t TitleEnd() const {
+    return line + static_cast<std::size_t>(std::count(name.begin(), name.end(), '\n'));
+  }
 };
 
 } // namespace VOK::MemPool::Tools

@@ -1,11 +1,14 @@
 #include "report/Reader.h"
 
-#include "report/FixedLines.h"
+#include "common/Failure.h"
+#include "common/Files.h"
 #include "report/Form.h"
-#include "report/Grid.h"
+#include "report/Json.h"
 #include "report/Lines.h"
 
+#include <algorithm>
 #include <fmt/format.h>
+#include <span>
 
 namespace VOK::MemPool::Tools {
 
@@ -65,10 +68,10 @@ public:
     std::size_t width = 0;
     for (int i = 0; i < cells; ++i)
       width += static_cast<std::size_t>(columns[static_cast<std::size_t>(i)].width) + 1;
-    const std::string blanks(width, ' ');
-    present = !fields.StartsWith(blanks);
+    const std::string spaces(width, ' ');
+    present = !fields.StartsWith(spaces);
     if (present) return true;
-    fields.TakeText(blanks);
+    fields.TakeText(spaces);
     next = static_cast<std::size_t>(cells);
     return false;
   }
@@ -80,6 +83,93 @@ private:
   const std::span<const Column> columns;
   std::size_t next = 0;
 };
+
+// The grid of a record map.
+
+/// Skips a line that repeats one piece, and returns how often.
+std::size_t TakePieces(Lines& lines, std::string (*form)(std::size_t)) {
+  constexpr std::size_t margin = 6;
+  constexpr std::size_t piece = 10;
+  lines.CheckWhole("a line of the record map");
+  const std::size_t size = std::max(lines.Get().size(), margin);
+  const std::size_t count = std::min((size - margin) / piece, Map::boxesPerRow);
+  lines.SkipExactly(form(count));
+  return count;
+}
+
+/// Takes a value per box from the rest of the line.
+template <class TakeValue>
+void TakeBoxes(Lines& lines, Fields& fields, std::span<Box> boxes, TakeValue takeValue) {
+  for (Box& box : boxes) {
+    takeValue(box);
+    fields.TakeText(wall);
+  }
+  fields.TakeEnd();
+  lines.Skip();
+}
+
+Number TakeTagged(Fields& fields, std::string_view tag) {
+  fields.TakeText(tag);
+  return fields.TakeLeftNumber(6);
+}
+
+Fields BeginLine(const Lines& lines) {
+  Fields fields(lines, "a row of the record map");
+  fields.TakeText(mapMargin);
+  return fields;
+}
+
+/// Adds the boxes of the present line to the map.
+void TakeTypes(Lines& lines, Map& map) {
+  Fields fields = BeginLine(lines);
+  do {
+    Box box{};
+    box.type = fields.TakeLeftType(8, box.isHead);
+    fields.TakeText(wall);
+    map.boxes.push_back(box);
+  } while (!fields.AtEnd() && map.boxes.size() % Map::boxesPerRow != 0);
+  fields.TakeEnd();
+  lines.Skip();
+}
+
+/// Takes the four lines of a grid row, and returns the number of its boxes.
+std::size_t TakeRow(Lines& lines, Map& map) {
+  const std::size_t first = map.boxes.size();
+  TakeTypes(lines, map);
+  const std::span<Box> boxes = std::span(map.boxes).subspan(first);
+
+  Fields offsets = BeginLine(lines);
+  TakeBoxes(lines, offsets, boxes, [&](Box& box) { box.offset = TakeTagged(offsets, "o="); });
+
+  Fields sizes(lines, "a row of the record map");
+  map.labels.push_back(sizes.TakeNumber(4));
+  sizes.TakeText(" ");
+  sizes.TakeText(wall);
+  TakeBoxes(lines, sizes, boxes, [&](Box& box) { box.size = TakeTagged(sizes, "s="); });
+
+  Fields numbers = BeginLine(lines);
+  TakeBoxes(lines, numbers, boxes, [&](Box& box) {
+    box.tag = numbers.TakeOneOf("ndu");
+    box.number = TakeTagged(numbers, "=");
+  });
+  return boxes.size();
+}
+
+/// Adds the grid that begins in the present line to the map.
+void ReadGrid(Lines& lines, Map& map) {
+  map.columns = static_cast<Number>(TakePieces(lines, MapHeading));
+  for (;;) {
+    const Lines rule = lines;
+    const std::size_t width = TakePieces(lines, MapRule);
+    const std::size_t boxes = lines.StartsWith(mapMargin) ? TakeRow(lines, map) : 0;
+    const bool isFull = boxes == Map::boxesPerRow;
+    const std::size_t expected = isFull ? Map::boxesPerRow : map.columns;
+    if (width != expected) rule.Fail(fmt::format("a rule over {} boxes", expected));
+    if (isFull) continue;
+    if (boxes > 0) lines.SkipExactly(MapRule(boxes));
+    return;
+  }
+}
 
 class Reader {
 public:
@@ -104,8 +194,8 @@ private:
     return fmt::format("{}{}", headerIndent, PoolLabel::version);
   }
 
-  /// The column at which a report starts in the present line. Behind other text of a program it
-  /// does so only if its next line follows.
+  /// The column at which a report starts in the present line. After other text of a program it
+  /// starts only if its next line follows.
   std::size_t FindTitle() const {
     const std::size_t title = lines.Get().find(PoolTitle::pool);
     if (title == 0) return 0;
@@ -114,7 +204,7 @@ private:
     for (const char* const start : {PoolLabel::version, PoolTitle::buckets, PoolTitle::freeBuckets,
                                     PoolTitle::extRecs, BucketTitle::bucket})
       if (lines.StartsWith(fmt::format("{}{}", headerIndent, start)))
-        lines.Fail(fmt::format("\"{}\" at a report's beginning in front of this", PoolTitle::pool));
+        lines.Fail(fmt::format("\"{}\" at a report's beginning before this", PoolTitle::pool));
     return std::string_view::npos;
   }
 
@@ -123,24 +213,24 @@ private:
     report.line = lines.GetNumber();
     report.name = lines.Get().substr(title + std::string_view(PoolTitle::pool).size());
     lines.Skip();
-    const Lines behindTitle = lines;
+    const Lines afterTitle = lines;
     while (!lines.StartsWith(VersionStart())) {
       if (lines.AtEnd() || lines.StartsWith(PoolTitle::pool))
-        behindTitle.Fail(fmt::format("\"{}\"", VersionStart()));
+        afterTitle.Fail(fmt::format("\"{}\"", VersionStart()));
       report.name += fmt::format("\n{}", lines.Get());
       lines.Skip();
     }
     report.isCrLf = lines.Get().ends_with('\r');
-    if (report.isCrLf) RemoveCr(report.name, behindTitle);
+    if (report.isCrLf) RemoveCr(report.name, afterTitle);
     lines.isCrLf = report.isCrLf;
   }
 
-  static void RemoveCr(std::string& name, const Lines& behindTitle) {
+  static void RemoveCr(std::string& name, const Lines& afterTitle) {
     std::string result;
     name += '\n';
     for (std::size_t i = 0; i < name.size(); ++i) {
       if (name[i] == '\n' && (i == 0 || name[i - 1] != '\r'))
-        behindTitle.Fail("a line end of CR and LF in front of this");
+        afterTitle.Fail("a line end of CR and LF before this");
       if (name[i] != '\r' || name[i + 1] != '\n') result += name[i];
     }
     result.pop_back();
@@ -164,6 +254,7 @@ private:
       ReadBucket(report.bucketReports.back());
     }
     CheckAllBuckets(report);
+    NumberLines(report);
     lines.isCrLf = false;
   }
 
@@ -177,7 +268,6 @@ private:
 
   void ReadBucket(BucketReport& bucket) {
     lines.SkipExactly("");
-    bucket.line = lines.GetNumber();
     Fields title(lines, "a bucket's title");
     title.TakeText(fmt::format("{}{}", titleIndent, BucketTitle::bucket));
     bucket.number = title.TakeId(3).value;
@@ -196,11 +286,10 @@ private:
     lines.SkipExactly("");
   }
 
-  /// A title behind an empty line; `second` is for a number behind the count.
+  /// A title after an empty line; `second` is for a number after the count.
   template <class Section>
   void ReadTitle(const std::string& start, Section& section, Number* second = nullptr) {
     lines.SkipExactly("");
-    section.line = lines.GetNumber();
     Fields title(lines, fmt::format("\"{}\"", start));
     title.TakeText(start);
     section.count = title.TakeNumber();
@@ -230,7 +319,7 @@ private:
     }
   }
 
-  /// A text, a count, a relation, a total; the text is whatever stands in front of the count.
+  /// A text, a count, a relation, a total; the text is all that precedes the count.
   void ReadWarning(std::optional<Warning>& warning, std::string_view relation) {
     if (!lines.StartsWith(warningStart)) return;
     Fields fields(lines, "a warning");
@@ -238,8 +327,8 @@ private:
     warning.emplace();
     warning->source = fields.TakeNumber(warningWidth);
     fields.TakeText(": ");
-    const std::string_view front = fields.GetRest().substr(0, fields.GetRest().rfind(relation));
-    const std::size_t count = front.find_last_not_of("0123456789") + 1; // 0 if there is no other
+    const std::string_view start = fields.GetRest().substr(0, fields.GetRest().rfind(relation));
+    const std::size_t count = start.find_last_not_of("0123456789") + 1; // 0 if there is no other
     warning->text = fields.TakeFirst(count);
     warning->count = fields.TakeNumber();
     fields.TakeText(relation);
@@ -254,5 +343,16 @@ private:
 } // namespace
 
 std::vector<Report> ReadReports(std::string_view text) { return Reader(text).ReadAll(); }
+
+std::vector<Report> ReadReportFile(const std::string& file, bool isJson) {
+  const std::string text = Input(file).ReadAll();
+  try {
+    std::vector<Report> reports = isJson ? ReadJson(text) : ReadReports(text);
+    if (reports.empty()) throw Failure("there is no report in it");
+    return reports;
+  } catch (const Failure& failure) {
+    throw Failure(fmt::format("{}: {}", file, failure.what()));
+  }
+}
 
 } // namespace VOK::MemPool::Tools

@@ -25,12 +25,12 @@ Bytes BytesOf(const Report& report) {
 }
 
 std::string Summarise(const std::vector<Report>& reports) {
-  constexpr auto form = "{:<{}} {:>10} {:>10} {:>10} {:>13} {:>13} {:>8}\n";
+  constexpr auto form = "{:<{}} {:>10} {:>10} {:>10} {:>13} {:>13} {:>8}{}\n";
   std::size_t width = 4;
   for (const Report& report : reports)
     width = std::max(width, OneLine(report.name).size());
   std::string text =
-      fmt::format(form, "pool", width, "used", "free", "ext", "bytes held", "payload", "share");
+      fmt::format(form, "pool", width, "used", "free", "ext", "bytes held", "payload", "share", "");
   for (const Report& report : reports) {
     const Bytes bytes = BytesOf(report);
     const std::string share =
@@ -38,7 +38,8 @@ std::string Summarise(const std::vector<Report>& reports) {
                         : fmt::format("{:.1f} %", static_cast<double>(bytes.payload) * 100.0 /
                                                       static_cast<double>(bytes.held));
     text += fmt::format(form, OneLine(report.name), width, report.usedRecs, report.freeRecs,
-                        report.numExtRecs, bytes.held, bytes.payload, share);
+                        report.numExtRecs, bytes.held, bytes.payload, share,
+                        report.IsOff() ? " off" : "");
   }
   return text;
 }

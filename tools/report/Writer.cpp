@@ -1,6 +1,5 @@
 #include "report/Writer.h"
 
-#include "report/FixedLines.h"
 #include "report/Form.h"
 
 #include <algorithm>
