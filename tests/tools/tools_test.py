@@ -4,7 +4,7 @@ writes, and random trace lines against a literal count.
 
 usage: tools_test.py VOKMEMPOOL POOL_CHILD GOLDEN
 
-VOK_MEMPOOL_APPROVE in the environment writes the golden texts of tests/golden/tools anew.
+VOK_MEMPOOL_APPROVE in the environment writes the golden texts of tests/golden/tools again.
 """
 import json
 import os
@@ -53,6 +53,8 @@ pool           used       free        ext    bytes held       payload    share
 de\\x09mo        508        280          2         19692          9860   50.1 %
 detailed         25         27          3      12349968      12349032  100.0 %
 """, ""),
+    ("report", DEMO.replace("Enabled     :        1", "Enabled     :        0"), 0,
+     "*\ndemo * 50.1 % off\n", ""),
     ("report --check", DEMO.replace("  508\n", "  509\n"), 1,
      "line 10: Used Recs is 509, not 508: the sum of Used in BUCKETS\n", "-: 1 inconsistency\n"),
     ("report --check", DEMO.replace(" 2000 ", " 2001 ", 1), 1,
@@ -76,7 +78,7 @@ detailed         25         27          3      12349968      12349032  100.0 %
      "       1\n*Min Rec Sz  :       10\n   Max Rec Sz  :       60\n   Data Align  :        2\n*",
      "\\x01: its first lines are not in the trace\n"
      "vokmempool: cache: a Clear lies between line 2 and line 6, the report is uncertain\n"
-     "vokmempool: 2 mixed or cut lines were passed over, the first is line 10\n"),
+     "vokmempool: 2 mixed or cut lines were skipped, the first is line 10\n"),
     ("trace --at 12", TRACE, 1, "", "-: it has no line 12, only 11\n"),
     ("report --text > /dev/full", DEMO, 1, "", "standard output: can't be written*"),
     ("report --text | head -1", DEMO * 400, 0, "MemPool::Mgr demo\n", ""),
@@ -185,7 +187,7 @@ def numbered(text):
 
 
 def test_library():
-    """Whatever the library prints the program takes, gives back, finds sound and can repeat."""
+    """The program reads, writes again, finds consistent and can rebuild what the library prints."""
     for text in REPORTS.values():
         if text.startswith("MemPool::Mgr "):
             data_of(text)
@@ -245,7 +247,7 @@ def lines_at_random(draw, steps, wild):
 
 
 def literal(lines):
-    """The bytes behind each event, and what --json says of the lines, by walks over plain lists."""
+    """The bytes after each event, and what --json says of the lines, by walks over plain lists."""
     pools, live, refused, course, at = {}, {}, [], [0], [None]
     sizes, lifetimes, numbers = Counter(), Counter(), Counter()
     for number, line in enumerate(lines, 1):

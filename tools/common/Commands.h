@@ -1,5 +1,5 @@
-// The subcommands, each in a source of its own: it declares its arguments, and what runs once they
-// are read. A subcommand ends in a Failure or does what it was asked.
+// The subcommands. Each of these functions declares the arguments of one, and what runs once they
+// are read. A subcommand that can't do its work throws a Failure.
 #ifndef VOK_MEMPOOL_TOOLS_COMMON_COMMANDS_H
 #define VOK_MEMPOOL_TOOLS_COMMON_COMMANDS_H
 

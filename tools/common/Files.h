@@ -1,4 +1,4 @@
-// The file that a command reads, and the stream that it writes on.
+// The file that a command reads, and the stream or file that it writes.
 #ifndef VOK_MEMPOOL_TOOLS_COMMON_FILES_H
 #define VOK_MEMPOOL_TOOLS_COMMON_FILES_H
 
@@ -41,7 +41,7 @@ void Print(std::string_view text);
 /// Writes a whole file. Fails if that can't be done.
 void WriteFile(const std::string& path, std::string_view text);
 
-/// A text on one line: what isn't printable is shown by its code.
+/// A text on one line: characters that aren't printable are shown by their code.
 std::string OneLine(std::string_view text);
 
 } // namespace VOK::MemPool::Tools

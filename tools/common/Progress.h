@@ -1,4 +1,4 @@
-// A bar on the terminal for work that takes long.
+// A bar on the terminal for long work.
 #ifndef VOK_MEMPOOL_TOOLS_COMMON_PROGRESS_H
 #define VOK_MEMPOOL_TOOLS_COMMON_PROGRESS_H
 
@@ -7,11 +7,11 @@
 
 namespace VOK::MemPool::Tools {
 
-/// It appears on the error stream after two seconds, if that is a terminal, and goes with the
+/// It appears on the error stream after two seconds, if that is a terminal, and is removed with the
 /// object.
 class Progress {
 public:
-  /// `total` bytes are to be read; 0 if nobody knows.
+  /// `total` bytes are to be read; 0 if unknown.
   explicit Progress(std::uint64_t total);
   ~Progress();
   Progress(const Progress&) = delete;

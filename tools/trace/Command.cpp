@@ -1,4 +1,4 @@
-// vokmempool trace: reads the trace lines in a program's output and tells what they come to.
+// vokmempool trace: reads the trace lines in a program's output and shows what they add up to.
 // Test: tests/tools/tools_test.py.
 #include "common/Commands.h"
 #include "common/Failure.h"
@@ -71,9 +71,9 @@ std::uint64_t ReadTrace(const Options& options, TraceLedger& ledger, std::uint64
   return number;
 }
 
-/// What makes a rebuilt pool differ from the one that was traced, on the error stream.
+/// Says on the error stream why a rebuilt pool may differ from the traced one.
 void WarnOf(const TraceLedger& ledger, const PoolNames& names) {
-  for (const TracedPool* pool : ledger.GetStanding()) {
+  for (const TracedPool* pool : ledger.GetLivePools()) {
     for (const ClearSpan& span : pool->clears.items)
       fmt::print(
           stderr,
@@ -84,7 +84,7 @@ void WarnOf(const TraceLedger& ledger, const PoolNames& names) {
                  OneLine(NameOf(names, pool->addr)));
   }
   if (ledger.mixed.count > 0)
-    fmt::print(stderr, "vokmempool: {} mixed or cut lines were passed over, the first is line {}\n",
+    fmt::print(stderr, "vokmempool: {} mixed or cut lines were skipped, the first is line {}\n",
                ledger.mixed.count, ledger.mixed.items.front().line);
 }
 
@@ -125,7 +125,7 @@ void Run(const Options& options) {
 void AddTrace(CLI::App& app) {
   const auto options = std::make_shared<Options>();
   CLI::App* const command = app.add_subcommand(
-      "trace", "Reads trace lines and tells what pools and records they come to");
+      "trace", "Reads trace lines and shows the pools and records that they add up to");
   command->add_option("FILE", options->file, "the output to read, - for standard input");
   command->add_option("--name", options->names, "POOL=NAME: the name of the pool at an address")
       ->expected(1)
@@ -144,7 +144,7 @@ void AddTrace(CLI::App& app) {
   setting(command->add_option("--max-record-size", options->maxRecordSize, "likewise"));
   setting(command->add_option("--min-record-size", options->minRecordSize, "likewise"));
   setting(command->add_flag("--keep-empty-buckets", options->keepEmptyBuckets, "likewise"));
-  command->footer("Example: what is still in use, and how did it stand at line 1200?\n"
+  command->footer("Example: what is still in use, and what were the pools at line 1200?\n"
                   "  ZOR_VOK_MEMPOOL_TRACE=1 ./program > out.txt; vokmempool trace out.txt\n"
                   "  vokmempool trace --at 1200 --name 5581c0de=cache out.txt");
   command->callback([options] { Run(*options); });

@@ -35,7 +35,7 @@ Json PoolJson(const TracedPool& pool, const PoolNames& names) {
           {"clears", clears}};
 }
 
-/// An array of which each element goes out by itself.
+/// Writes an array element by element.
 template <class Items, class ToJson>
 void WriteArray(const char* key, const Items& items, ToJson toJson,
                 const std::function<void(std::string_view)>& write) {
@@ -63,13 +63,13 @@ void WriteTraceJson(const TraceLedger& ledger, std::uint64_t numLines, const Poo
   head.pop_back(); // the arrays follow in the same object
   write(head);
   WriteArray(
-      "standingPools", ledger.GetStanding(),
+      "standingPools", ledger.GetLivePools(),
       [&](const TracedPool* pool) { return PoolJson(*pool, names); }, write);
   WriteArray(
       "gonePools", ledger.gone.items, [&](const TracedPool& pool) { return PoolJson(pool, names); },
       write);
   WriteArray(
-      "live", ledger.GetLive(),
+      "live", ledger.GetLiveRecords(),
       [](const TraceLedger::Live& record) {
         return Json{{"line", record.line},
                     {"pool", BareAddress(record.pool)},

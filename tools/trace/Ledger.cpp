@@ -10,8 +10,8 @@ TraceLedger::Verdict TraceLedger::Take(LineNumber line, const TraceEvent& event)
   ++numEvents;
   switch (event.letter) {
   case 'c':
-    End(event.pool, 0); // its "d:" is missing, if it stands
-    Make(event.pool, line);
+    End(event.pool, 0); // if it is live, its "d:" is missing
+    Begin(event.pool, line);
     ++numMade;
     break;
   case 'd':
@@ -33,26 +33,26 @@ void TraceLedger::TakeMixed(LineNumber line, std::string_view text) {
   mixed.Add({line, std::string(text.substr(0, shown))});
 }
 
-/// The standing pool of that address. One whose making isn't in the trace begins here.
-TraceLedger::Standing& TraceLedger::Find(std::uint64_t addr) {
+/// The live pool of that address, which begins here if its construction isn't in the trace.
+TraceLedger::LivePool& TraceLedger::Find(std::uint64_t addr) {
   if (recent != nullptr && recent->pool.addr == addr) return *recent;
-  const auto found = standing.find(addr);
-  recent = found == standing.end() ? &Make(addr, 0) : &found->second;
+  const auto found = livePools.find(addr);
+  recent = found == livePools.end() ? &Begin(addr, 0) : &found->second;
   return *recent;
 }
 
-TraceLedger::Standing& TraceLedger::Make(std::uint64_t addr, LineNumber line) {
-  Standing& made = standing[addr];
-  made.key = ++lastKey;
-  made.pool.addr = addr;
-  made.pool.made = line;
-  addrByKey[made.key] = addr;
-  return made;
+TraceLedger::LivePool& TraceLedger::Begin(std::uint64_t addr, LineNumber line) {
+  LivePool& begun = livePools[addr];
+  begun.key = ++lastKey;
+  begun.pool.addr = addr;
+  begun.pool.made = line;
+  addrByKey[begun.key] = addr;
+  return begun;
 }
 
 void TraceLedger::End(std::uint64_t addr, LineNumber line) {
-  const auto found = standing.find(addr);
-  if (found == standing.end()) return;
+  const auto found = livePools.find(addr);
+  if (found == livePools.end()) return;
   TracedPool& pool = found->second.pool;
   MarkPeak(pool);
   if (pool.bytesAtPeak > 0) endedSincePeak.emplace_back(addr, pool.bytesAtPeak);
@@ -61,12 +61,12 @@ void TraceLedger::End(std::uint64_t addr, LineNumber line) {
   numStale += pool.records + pool.uncertainRecords;
   gone.Add(pool);
   addrByKey.erase(found->second.key);
-  standing.erase(found);
+  livePools.erase(found);
   recent = nullptr;
   if (numStale > 1000 && numStale > live.GetSize() / 2) DropStale();
 }
 
-void TraceLedger::Alloc(Standing& at, LineNumber line, const TraceEvent& event, Verdict& verdict) {
+void TraceLedger::Alloc(LivePool& at, LineNumber line, const TraceEvent& event, Verdict& verdict) {
   TracedPool& pool = at.pool;
   LiveRecord& record = live.FindOrAdd(event.data);
   if (record.line != 0) {
@@ -94,7 +94,7 @@ void TraceLedger::Alloc(Standing& at, LineNumber line, const TraceEvent& event, 
   endedSincePeak.clear();
 }
 
-void TraceLedger::Free(Standing& at, LineNumber line, const TraceEvent& event, Verdict& verdict) {
+void TraceLedger::Free(LivePool& at, LineNumber line, const TraceEvent& event, Verdict& verdict) {
   TracedPool& pool = at.pool;
   LiveRecord* const record = live.Find(event.data);
   const TracedPool* const owner = record == nullptr ? nullptr : OwnerOf(*record);
@@ -122,11 +122,11 @@ void TraceLedger::Free(Standing& at, LineNumber line, const TraceEvent& event, V
 TracedPool* TraceLedger::OwnerOf(const LiveRecord& record) {
   if (recent != nullptr && recent->key == record.pool) return &recent->pool;
   const auto found = addrByKey.find(record.pool);
-  return found == addrByKey.end() ? nullptr : &standing.at(found->second).pool;
+  return found == addrByKey.end() ? nullptr : &livePools.at(found->second).pool;
 }
 
-/// The address of a live record was given out again, so its pool has been cleared between the two
-/// lines. The Clear that is known already explains it if that lies behind the first of them.
+/// The address of a live record was allocated again, so its pool has been cleared between the two
+/// lines. A known Clear already explains it if it comes after the first of them.
 void TraceLedger::ProveClear(TracedPool& owner, LineNumber after, LineNumber before,
                              Verdict& verdict) {
   if (after < owner.clearBefore) {
@@ -146,8 +146,8 @@ void TraceLedger::ProveClear(TracedPool& owner, LineNumber after, LineNumber bef
   owner.bytes = 0;
 }
 
-/// To be called before `bytes` of a pool changes: the first change behind a peak keeps what the
-/// pool held there.
+/// To be called before `bytes` of a pool changes: the first change after a peak keeps what the pool
+/// held at the peak.
 void TraceLedger::MarkPeak(TracedPool& pool) const {
   if (pool.peakMark == numPeaks) return;
   pool.peakMark = numPeaks;
@@ -159,9 +159,9 @@ void TraceLedger::DropStale() {
   numStale = 0;
 }
 
-std::vector<const TracedPool*> TraceLedger::GetStanding() const {
+std::vector<const TracedPool*> TraceLedger::GetLivePools() const {
   std::vector<const TracedPool*> pools;
-  for (const auto& [addr, at] : standing)
+  for (const auto& [addr, at] : livePools)
     pools.push_back(&at.pool);
   std::sort(pools.begin(), pools.end(), [](const TracedPool* a, const TracedPool* b) {
     return std::pair(a->made, a->addr) < std::pair(b->made, b->addr);
@@ -169,12 +169,12 @@ std::vector<const TracedPool*> TraceLedger::GetStanding() const {
   return pools;
 }
 
-std::vector<TraceLedger::Live> TraceLedger::GetLive() const {
+std::vector<TraceLedger::Live> TraceLedger::GetLiveRecords() const {
   std::vector<Live> records;
   for (const LiveRecord& record : live.GetPlaces()) {
     const auto owner = addrByKey.find(record.pool);
     if (record.line == 0 || owner == addrByKey.end()) continue;
-    const TracedPool& pool = standing.at(owner->second).pool;
+    const TracedPool& pool = livePools.at(owner->second).pool;
     records.push_back(
         {record.data, pool.addr, record.line, record.size, record.line < pool.clearBefore});
   }
@@ -185,7 +185,7 @@ std::vector<TraceLedger::Live> TraceLedger::GetLive() const {
 
 std::vector<std::pair<std::uint64_t, std::uint64_t>> TraceLedger::GetPoolsAtPeak() const {
   auto pools = endedSincePeak;
-  for (const auto& [addr, at] : standing) {
+  for (const auto& [addr, at] : livePools) {
     const std::uint64_t held = at.pool.peakMark == numPeaks ? at.pool.bytesAtPeak : at.pool.bytes;
     if (held > 0) pools.emplace_back(addr, held);
   }

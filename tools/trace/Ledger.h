@@ -1,5 +1,5 @@
-// What the trace lines of a program come to: its pools, the records that live, and what the lines
-// can't have told. One line after the other; memory goes with the live records alone.
+// What the trace lines of a program add up to: its pools, its live records, and what the lines
+// leave uncertain. It takes one line after the other; memory grows with the live records alone.
 // Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_TRACE_LEDGER_H
 #define VOK_MEMPOOL_TOOLS_TRACE_LEDGER_H
@@ -20,7 +20,7 @@ namespace VOK::MemPool::Tools {
 
 using LineNumber = std::uint64_t; ///< from 1; 0 where the line isn't in the trace
 
-/// A list that would grow with the lines: it counts all, and keeps the first ones.
+/// A list that would grow with the lines: it counts all items, and keeps the first ones.
 template <class Item>
 struct Kept {
   static constexpr std::size_t most = 100;
@@ -34,7 +34,7 @@ struct Kept {
   }
 };
 
-/// A Clear, which no line tells: it lies behind the first and in front of the second line.
+/// A Clear, which writes no line: it happened between these two lines.
 struct ClearSpan {
   LineNumber after, before;
 };
@@ -43,7 +43,7 @@ struct TracedPool {
   std::uint64_t addr = 0;
   LineNumber made = 0, gone = 0;
   std::uint64_t requests = 0, frees = 0;
-  std::uint64_t records = 0, bytes = 0; ///< live for certain; at the end of a gone pool
+  std::uint64_t records = 0, bytes = 0; ///< certainly live; of a destroyed pool, at its end
   std::uint64_t uncertainRecords = 0, uncertainBytes = 0;
   std::uint64_t peakBytes = 0;
   Kept<ClearSpan> clears;
@@ -53,7 +53,7 @@ struct TracedPool {
   std::uint64_t bytesAtPeak = 0; ///< kept when `bytes` changes after that peak
 };
 
-/// A pointer given back that wasn't live in its pool.
+/// A freed pointer that wasn't live in its pool.
 struct RefusedFree {
   LineNumber line;
   std::uint64_t pool, data;
@@ -77,12 +77,12 @@ public:
   enum class Outcome {
     Done,
     Refused,  ///< the pointer wasn't live in this pool
-    Uncertain ///< the record lived in front of a Clear
+    Uncertain ///< the record was live before a Clear
   };
 
   struct Verdict {
     Outcome outcome = Outcome::Done;
-    std::uint64_t cleared = 0; ///< the pool that the line proves to have been cleared
+    std::uint64_t cleared = 0; ///< the pool that was cleared, as the line proves
   };
 
   Kept<TracedPool> gone;
@@ -91,46 +91,46 @@ public:
   Kept<RefusedFree> refused;
   Kept<MixedLine> mixed;
   std::uint64_t numEvents = 0, numMade = 0, numClears = 0;
-  std::uint64_t bytes = 0; ///< live for certain, over all pools
+  std::uint64_t bytes = 0; ///< certainly live, over all pools
   std::uint64_t peakBytes = 0, peakEvent = 0;
   LineNumber peakLine = 0;
 
   Verdict Take(LineNumber line, const TraceEvent& event);
   void TakeMixed(LineNumber line, std::string_view text);
 
-  /// By the line of their making, and at the same line by address.
-  std::vector<const TracedPool*> GetStanding() const;
+  /// By the line of their construction, and at the same line by address.
+  std::vector<const TracedPool*> GetLivePools() const;
 
   /// By line.
-  std::vector<Live> GetLive() const;
+  std::vector<Live> GetLiveRecords() const;
 
   /// What each pool held at the peak, largest first.
   std::vector<std::pair<std::uint64_t, std::uint64_t>> GetPoolsAtPeak() const;
 
 private:
-  struct Standing {
+  struct LivePool {
     std::uint32_t key;
     TracedPool pool;
   };
 
-  Standing& Find(std::uint64_t addr);
-  Standing& Make(std::uint64_t addr, LineNumber line);
+  LivePool& Find(std::uint64_t addr);
+  LivePool& Begin(std::uint64_t addr, LineNumber line);
   void End(std::uint64_t addr, LineNumber line);
-  void Alloc(Standing& standing, LineNumber line, const TraceEvent& event, Verdict& verdict);
-  void Free(Standing& standing, LineNumber line, const TraceEvent& event, Verdict& verdict);
+  void Alloc(LivePool& at, LineNumber line, const TraceEvent& event, Verdict& verdict);
+  void Free(LivePool& at, LineNumber line, const TraceEvent& event, Verdict& verdict);
   TracedPool* OwnerOf(const LiveRecord& record);
   void ProveClear(TracedPool& owner, LineNumber after, LineNumber before, Verdict& verdict);
   void MarkPeak(TracedPool& pool) const;
   void DropStale();
 
-  LiveTable live;                                             ///< may lag behind ended pools
-  std::uint64_t numStale = 0;                                 ///< entries of ended pools
-  std::unordered_map<std::uint64_t, Standing> standing;       ///< by address
-  std::unordered_map<std::uint32_t, std::uint64_t> addrByKey; ///< of standing pools
+  LiveTable live;                                        ///< also those of ended pools, for a while
+  std::uint64_t numStale = 0;                            ///< entries of ended pools
+  std::unordered_map<std::uint64_t, LivePool> livePools; ///< by address
+  std::unordered_map<std::uint32_t, std::uint64_t> addrByKey;          ///< of live pools
   std::vector<std::pair<std::uint64_t, std::uint64_t>> endedSincePeak; ///< address and bytes
   std::uint32_t lastKey = 0;
   std::uint64_t numPeaks = 0;
-  Standing* recent = nullptr; ///< the pool of the line in front, as the next is likely its own
+  LivePool* recent = nullptr; ///< the pool of the previous line, likely that of the next too
 };
 
 } // namespace VOK::MemPool::Tools

@@ -1,5 +1,5 @@
 // The live records of a trace by address: a table with open addressing, since finding, adding and
-// taking out is nearly all the work of a long trace.
+// removing is nearly all the work of a long trace.
 // Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_TRACE_LIVETABLE_H
 #define VOK_MEMPOOL_TOOLS_TRACE_LIVETABLE_H
@@ -18,7 +18,7 @@ struct LiveRecord {
   std::uint32_t pool = 0;  ///< the key of its pool
 };
 
-/// Places are tried from the one of the address upward, around the end. At most half are taken.
+/// Linear probing upward from the address's own place, around the end. At most half are in use.
 class LiveTable {
 public:
   std::size_t GetSize() const { return size; }
@@ -33,7 +33,7 @@ public:
   /// The record of that address or, if there is none, an empty one, which is to get a line at once.
   LiveRecord& FindOrAdd(std::uint64_t data);
 
-  /// Takes a record out and closes the gap: what was tried past it moves up.
+  /// Removes a record and closes the gap in the probed places after it.
   void Remove(LiveRecord& record);
 
   template <class Condition>

@@ -19,8 +19,8 @@ std::string Massif::GetText(const TraceLedger& ledger, const PoolNames& names,
                             std::string_view source) const {
   std::vector<Snapshot> all = snapshots;
   if (all.back().event != ledger.numEvents) all.push_back({ledger.numEvents, ledger.bytes});
-  const auto isBehind = [&](const Snapshot& s) { return s.event >= ledger.peakEvent; };
-  auto peak = std::find_if(all.begin(), all.end(), isBehind);
+  const auto isAtOrAfter = [&](const Snapshot& s) { return s.event >= ledger.peakEvent; };
+  auto peak = std::find_if(all.begin(), all.end(), isAtOrAfter);
   if (peak->event != ledger.peakEvent)
     peak = all.insert(peak, {ledger.peakEvent, ledger.peakBytes});
 

@@ -11,11 +11,11 @@
 
 namespace VOK::MemPool::Tools {
 
-/// Samples at even distances, at most a hundred: where there would be more, every second one goes
-/// and the distance doubles.
+/// Samples at even distances, at most a hundred: at the limit every second one is dropped and the
+/// distance doubles.
 class Massif {
 public:
-  /// To be called behind each trace line.
+  /// To be called after each trace line.
   void Sample(const TraceLedger& ledger) {
     if (ledger.numEvents >= next) Add(ledger);
   }

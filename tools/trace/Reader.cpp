@@ -7,7 +7,7 @@ namespace {
 constexpr std::string_view prefix = "zvpt:";
 constexpr std::uint32_t maxRequest = 1073741823; // the library serves no larger one
 
-/// Takes values off the front of a text, by hand: it is the work of each line.
+/// Takes values from the start of a text, by hand, because each line needs it.
 class Taker {
 public:
   explicit Taker(std::string_view text) : at(text.data()), end(at + text.size()) {}
@@ -29,7 +29,7 @@ public:
     return at != start && at - start <= 16;
   }
 
-  /// A decimal number that a request can have, with no zero in front.
+  /// A decimal number that a request can have, without a leading zero.
   bool TakeSize(std::uint32_t& size) {
     const char* const start = at;
     std::uint64_t number = 0;

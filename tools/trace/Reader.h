@@ -1,5 +1,6 @@
-// The trace lines of a program's output: what a line tells, and the lines of a long text one by
-// one. Test: tests/tools/tools_test.py.
+// The trace lines of a program's output: the content of a line, and the lines of a long text one by
+// one.
+// Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_TRACE_READER_H
 #define VOK_MEMPOOL_TOOLS_TRACE_READER_H
 
@@ -14,7 +15,7 @@
 namespace VOK::MemPool::Tools {
 
 struct TraceEvent {
-  char letter = 0;        ///< c: made, d: gone, a: request served, f: pointer given back
+  char letter = 0;        ///< c: construction, d: destruction, a: request served, f: Free
   std::uint64_t pool = 0; ///< its address
   std::uint64_t data = 0; ///< of a and f: what the caller holds
   std::uint32_t size = 0; ///< of a: the bytes asked for

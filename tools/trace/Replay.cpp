@@ -9,14 +9,14 @@
 namespace VOK::MemPool::Tools {
 
 Replay::Replay(PoolNames names_) : names(std::move(names_)) {
-  ZOR_VOK_MEMPOOL_TRACE(false); // the trace is what is read, not what is written
+  ZOR_VOK_MEMPOOL_TRACE(false); // the program reads a trace and writes none
 }
 
 void Replay::Take(const TraceEvent& event, const TraceLedger::Verdict& verdict) {
   if (verdict.cleared != 0) PoolOf(verdict.cleared).Clear();
   switch (event.letter) {
   case 'c':
-    Make(event.pool);
+    Construct(event.pool);
     break;
   case 'd':
     pools.erase(event.pool);
@@ -38,15 +38,15 @@ void Replay::Print(bool detailed) const {
 }
 
 Mgr& Replay::PoolOf(std::uint64_t addr) {
-  if (!pools.contains(addr)) Make(addr);
+  if (!pools.contains(addr)) Construct(addr);
   return *pools.at(addr);
 }
 
-void Replay::Make(std::uint64_t addr) {
+void Replay::Construct(std::uint64_t addr) {
   pools.erase(addr);
   const std::string name = NameOf(names, addr);
   if (GetMgr(name.c_str()) != nullptr)
-    throw Failure(fmt::format("two pools that stand together have the name {}", OneLine(name)));
+    throw Failure(fmt::format("two live pools have the name {}", OneLine(name)));
   pools[addr] = std::make_unique<Mgr>(name.c_str());
 }
 

@@ -13,7 +13,7 @@ std::string LineText(LineNumber line) {
   return line == 0 ? "not in the trace" : fmt::format("line {}", line);
 }
 
-/// The items, with a word on those that aren't shown.
+/// The first items, and the number of those that aren't shown.
 template <class Items, class Form>
 std::string Section(std::string_view title, const Items& items, std::uint64_t count, Form form) {
   std::string text = fmt::format("\n{} ({})\n", title, count);
@@ -29,7 +29,7 @@ std::string Section(std::string_view title, const Items& items, std::uint64_t co
 
 std::string PoolText(const TracedPool& pool, const PoolNames& names) {
   std::string text = fmt::format(
-      "{}: made {}, requests {}, given back {}, peak {} bytes, {} {} records of {} bytes",
+      "{}: construction {}, requests {}, freed {}, peak {} bytes, {} {} records of {} bytes",
       NameOf(names, pool.addr), LineText(pool.made), pool.requests, pool.frees, pool.peakBytes,
       pool.gone == 0 ? "live" : "left", pool.records, pool.bytes);
   if (pool.uncertainRecords > 0)
@@ -76,35 +76,35 @@ std::string NameOf(const PoolNames& names, std::uint64_t addr) {
 
 std::string SummariseTrace(const TraceLedger& ledger, std::uint64_t numLines,
                            const PoolNames& names) {
-  const std::vector<const TracedPool*> pools = ledger.GetStanding();
-  const std::vector<TraceLedger::Live> live = ledger.GetLive();
+  const std::vector<const TracedPool*> pools = ledger.GetLivePools();
+  const std::vector<TraceLedger::Live> live = ledger.GetLiveRecords();
   std::string text = fmt::format("{} lines, {} of them trace lines\n", numLines, ledger.numEvents);
-  text += fmt::format("pools: {} made, {} gone, {} stand at the end\n", ledger.numMade,
+  text += fmt::format("pools: {} constructed, {} destroyed, {} live at the end\n", ledger.numMade,
                       ledger.gone.count, pools.size());
   text +=
       fmt::format("peak of live bytes: {} at {}{}\n", ledger.peakBytes, LineText(ledger.peakLine),
                   ledger.numClears > 0 ? ", at most: a Clear has no line" : "");
-  text += Section("pools that stand", pools, pools.size(),
+  text += Section("live pools", pools, pools.size(),
                   [&](const TracedPool* pool) { return PoolText(*pool, names); });
-  text += Section("pools that are gone", ledger.gone.items, ledger.gone.count,
-                  [&](const TracedPool& pool) {
-                    return fmt::format("gone {}: {}", LineText(pool.gone), PoolText(pool, names));
-                  });
+  text +=
+      Section("destroyed pools", ledger.gone.items, ledger.gone.count, [&](const TracedPool& pool) {
+        return fmt::format("destruction {}: {}", LineText(pool.gone), PoolText(pool, names));
+      });
   text += Section("live records at the end", live, live.size(), [&](const auto& record) {
     return fmt::format("line {}: {} bytes at {} of {}{}", record.line, record.size,
                        BareAddress(record.data), NameOf(names, record.pool),
-                       record.isUncertain ? ", uncertain: behind it lies a Clear" : "");
+                       record.isUncertain ? ", uncertain: a Clear follows it" : "");
   });
   text += Sizes(ledger) + Lifetimes(ledger);
   text +=
-      Section("pointers given back that were not live in their pool", ledger.refused.items,
+      Section("freed pointers that were not live in their pool", ledger.refused.items,
               ledger.refused.count, [&](const RefusedFree& free) {
                 return fmt::format("line {}: {} to {}{}", free.line, BareAddress(free.data),
                                    NameOf(names, free.pool),
                                    free.owner == 0 ? "" : ", live in " + NameOf(names, free.owner));
               });
-  text += Section("lines that are mixed or cut, and were passed over", ledger.mixed.items,
-                  ledger.mixed.count, [](const MixedLine& line) {
+  text += Section("skipped lines, which are mixed or cut", ledger.mixed.items, ledger.mixed.count,
+                  [](const MixedLine& line) {
                     return fmt::format("line {}: {}", line.line, OneLine(line.text));
                   });
   return text;

@@ -1,4 +1,4 @@
-// What a trace came to, for a reader and for a program.
+// The result of reading a trace, as a text and as JSON.
 // Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_TRACE_SUMMARY_H
 #define VOK_MEMPOOL_TOOLS_TRACE_SUMMARY_H
@@ -25,7 +25,7 @@ std::string NameOf(const PoolNames& names, std::uint64_t addr);
 std::string SummariseTrace(const TraceLedger& ledger, std::uint64_t numLines,
                            const PoolNames& names);
 
-/// Writes a JSON document in pieces. docs/tools.md tells the form.
+/// Writes a JSON document in pieces. docs/tools.md documents the form.
 void WriteTraceJson(const TraceLedger& ledger, std::uint64_t numLines, const PoolNames& names,
                     const std::function<void(std::string_view)>& write);
 
