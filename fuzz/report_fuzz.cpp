@@ -1,14 +1,14 @@
 // Hostile text for the reader of reports: what it takes, it gives back byte for byte, by way of
 // JSON too, and draws it; all else it refuses. A text that starts with a brace is taken for a
 // document.
-#include "Failure.h"
-#include "PictureData.h"
-#include "ReportCheck.h"
-#include "ReportJson.h"
-#include "ReportReader.h"
-#include "ReportSummary.h"
-#include "ReportWriter.h"
 #include "Target.h"
+#include "common/Failure.h"
+#include "picture/Data.h"
+#include "report/Check.h"
+#include "report/Json.h"
+#include "report/Reader.h"
+#include "report/Summary.h"
+#include "report/Writer.h"
 
 #include <cstdlib>
 #include <string>

@@ -1,9 +1,9 @@
 // Hostile text for the reader of traces, its ledger and the replay on the real library: the replay
 // makes no call that a pool does not allow.
-#include "Massif.h"
-#include "Replay.h"
 #include "Target.h"
-#include "TraceSummary.h"
+#include "trace/Massif.h"
+#include "trace/Replay.h"
+#include "trace/Summary.h"
 
 #include <sstream>
 #include <string>

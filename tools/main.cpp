@@ -1,8 +1,8 @@
-// vokmempool: reads what pools print. Exit status 0: done; 1: a failure, told in one line on the
-// error stream; 2: bad arguments.
-#include "Commands.h"
-#include "Failure.h"
-#include "Files.h"
+// vokmempool: reads what pools print. Exit status 0: done; 1: a failure, with one line on the error
+// stream; 2: bad arguments.
+#include "common/Commands.h"
+#include "common/Failure.h"
+#include "common/Files.h"
 
 #include <CLI/CLI.hpp>
 #include <csignal>
@@ -38,7 +38,7 @@ int Run(int argc, char** argv) {
 
 int main(int argc, char** argv) {
 #ifdef SIGPIPE
-  // A reader that has enough ends the program without a word, whatever its parent has set.
+  // A closed pipe ends the program without a message, even if its parent ignores the signal.
   std::signal(SIGPIPE, SIG_DFL);
 #endif
   try {

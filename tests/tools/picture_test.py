@@ -72,10 +72,10 @@ def test_one(browser, text):
     browser.evaluate("document.querySelector('.head').querySelectorAll('button')[2].focus()")
     browser.press("Enter")
     same(browser.evaluate("document.querySelectorAll('.strips .row > span')[2].innerText"),
-         str(max(len(used_in(bucket)) for bucket in pools[0])), "the most used bucket in front")
+         str(max(len(used_in(bucket)) for bucket in pools[0])), "the most used bucket first")
 
-    # A record whose type byte went wild, and links that lead nowhere: far away, into a record and
-    # behind the last one.
+    # A record of an unknown type, and links that lead to no record: far away, into one and after the
+    # last.
     damaged = re.sub("(00001 )(USED|FREE)", r"\1UNKN", text, count=1)
     places = ["9999", "3", str(rows[-1]["end"])]
     links = iter(places)
@@ -96,8 +96,14 @@ def test_pair(browser, before, now):
          "what came and went, and the cells that came")
 
 
+def test_off(browser):
+    draw(browser, tool("trace", "--off", "--detailed", "--at", 1, given="zvpt:c:a0\n"))
+    same(browser.evaluate("[...document.querySelectorAll('main h2, main .lead')].map((e) => e.innerText)"),
+         ["a0off", "Pooling is off: requests go to the heap."], "a pool that is off")
+
+
 def test_many(browser):
-    """10,000 buckets, and half of their records given back."""
+    """10,000 buckets, and half of their records freed."""
     data = [f"a0:{i + 1:x}000:" for i in range(200000)]
     trace = "".join(f"zvpt:a:{record}12\n" for record in data)
     trace += "".join(f"zvpt:f:{record}\n" for record in random.Random(5).sample(data, 100000))
@@ -117,5 +123,6 @@ half_time, end = Work(116, 3000, names=("</script><b>", "second")).reports
 with tempfile.TemporaryDirectory() as folder, Browser(sys.argv[3]) as chromium, chdir(folder):
     test_one(chromium, end)
     test_pair(chromium, half_time, end)
+    test_off(chromium)
     test_many(chromium)
     same(chromium.messages, [], "messages in the console")

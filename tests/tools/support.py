@@ -30,8 +30,8 @@ def tool(*arguments, given="", keys=None):
 
 
 def random_calls(draw, steps, clears, names, settings):
-    """Calls of the child program on two pools, which it prints in detail behind each half of the
-    steps. The first one also gets a block of the other back."""
+    """Calls of the child program on two pools, which it prints in detail after each half of the
+    steps. The first one is also asked to free a block of the other."""
     largest, blocks = settings["MAX_RECORD_SIZE"], count(1)
     calls = [f"pool {name}" for name in names] + ["alloc 1"]
     pools = [(name, []) for name in names]

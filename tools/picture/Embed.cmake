@@ -1,5 +1,5 @@
-# Joins a page and the files that it names into a source with two texts: what stands in front of the
-# page's data, and what stands behind. Arguments: PAGE, OUTPUT.
+# Joins a page and the files that it names into a source with two texts: what precedes the page's
+# data, and what follows. Arguments: PAGE, OUTPUT.
 get_filename_component(folder ${PAGE} DIRECTORY)
 file(READ ${PAGE} page)
 
@@ -28,7 +28,7 @@ string(SUBSTRING "${page}" 0 ${begin} start)
 string(SUBSTRING "${page}" ${end} -1 rest)
 
 file(WRITE ${OUTPUT} "// Made from ${PAGE}.
-#include \"PicturePage.h\"
+#include \"picture/Data.h\"
 
 namespace VOK::MemPool::Tools {
 

@@ -68,7 +68,7 @@ function paintCell(context, look, isHead, x, y, width) {
   if (isHead) paintMark(context, palette.next, x + ink / 2, top + bar + 1, below - 1);
 }
 
-/** A frame around a cell: whole for the record that is looked at, dashed for its next. */
+/** A frame around a cell: whole for the record that is shown, dashed for its next. */
 function paintFrame(context, isDashed, x, y, width) {
   const { above, bar, gap } = cellMetrics;
   context.strokeStyle = palette.ink;

@@ -12,7 +12,7 @@ const digits = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/
 const digitOf = new Uint8Array(128);
 for (let i = 0; i < 64; ++i) digitOf[digits.charCodeAt(i)] = i;
 
-/** A stream of bits, six a character. */
+/** A stream of bits, six per character. */
 class Bits {
   constructor(text) {
     this.text = text;
@@ -29,7 +29,7 @@ class Bits {
   }
 }
 
-/** A flag a record; the text may be empty or shorter, which is a false. */
+/** A flag per record; those beyond the end of the text are false. */
 function flagsOf(text, count) {
   const bits = new Bits(text);
   const flags = new Uint8Array(count);
@@ -81,7 +81,7 @@ class Bucket {
     return this.pool.faults.filter((fault) => fault.bucket === this.index && fault.record === record);
   }
 
-  // The codes are those of tools/RecordBits.h.
+  // The codes are those of tools/picture/RecordBits.h.
   unpackRecords() {
     const bits = new Bits(this.records);
     const type = new Uint8Array(this.count);

@@ -19,7 +19,7 @@ function makeHead() {
   }
   const faults = sum(pools, "numFaults");
   if (faults > 0)
-    lines.push(make("p", { class: "lead fault" }, `${counted(faults, "contradiction")} in the text: see below.`));
+    lines.push(make("p", { class: "lead fault" }, `${counted(faults, "inconsistency", "inconsistencies")} in the text: see below.`));
   const file = data.files.at(-1) ?? "";
   document.title = `Pools of ${file}`;
   document.getElementById("head").append(
@@ -36,7 +36,7 @@ function makeSwatch(look, isHead) {
 
 function makeGuide() {
   const kinds = [["used", isPair ? "used, as before" : "used"], ["free", "free"], ["free", "served next", true]];
-  if (isPair) kinds.push(["came", "came into use"], ["went", "given back"]);
+  if (isPair) kinds.push(["came", "came into use"], ["went", "freed"]);
   kinds.push(["damaged", "damaged"]);
   const legend = make("ul", { class: "legend" }, ...kinds.map(([look, text, isHead]) =>
     make("li", {}, makeSwatch(look, isHead), text)));
@@ -52,12 +52,17 @@ function makeGuide() {
   if (pools.length > 1) guide.append(select);
 }
 
+/** What a pool's name is marked with. */
+function marksOf(pool) {
+  return [pool.change, pool.off ? "off" : ""].filter((mark) => mark !== "");
+}
+
 function makeOverview() {
   const held = largest(pools, (pool) => pool.held);
   const columns = [
     { title: "Pool", key: (pool) => pool.label,
       show: (pool) => make("a", { href: `#pool-${pool.index}`, class: pool.change }, pool.label,
-        pool.change === "" ? "" : ` (${pool.change})`) },
+        ...marksOf(pool).map((mark) => ` (${mark})`)) },
     numberColumn("Used", "used"), numberColumn("Free", "free"), ...changeColumns(),
     numberColumn("Ext", "presentExt", "ext records"), numberColumn("Buckets", "presentBuckets"),
     numberColumn("Bytes held", "held", "heap blocks with their headers"),
@@ -122,7 +127,7 @@ function makeFaults(pool) {
   const items = pool.faults.map((fault) => make("li", {}, make("span", { class: "quiet" }, `line ${fault.line} `), fault.text));
   const rest = pool.numFaults - items.length;
   if (rest > 0) items.push(make("li", { class: "quiet" }, `and ${formatNumber(rest)} more, which vokmempool report --check lists`));
-  const details = makeDetails(counted(pool.numFaults, "contradiction"), make("ul", { class: "faults" }, ...items));
+  const details = makeDetails(counted(pool.numFaults, "inconsistency", "inconsistencies"), make("ul", { class: "faults" }, ...items));
   details.classList.add("fault");
   return details;
 }
@@ -144,8 +149,9 @@ function makeSection(pool) {
   const header = make("dl", { class: "header" }, ...pool.header.map(([label, value]) =>
     make("div", {}, make("dt", {}, label), make("dd", {}, value))));
   pool.section = make("section", { id: `pool-${pool.index}`, class: pool.change },
-    make("h2", {}, pool.label, pool.change === "" ? "" : make("span", { class: `${pool.change} badge` }, pool.change)),
-    make("p", { class: "lead" }, pool.buckets.length === 0 ? "No buckets." :
+    make("h2", {}, pool.label, ...marksOf(pool).map((mark) => make("span", { class: `${mark} badge` }, mark))),
+    make("p", { class: "lead" }, pool.buckets.length === 0 ?
+      pool.off ? "Pooling is off: requests go to the heap." : "No buckets." :
       `${counted(pool.presentBuckets, "bucket")} of ${counted(pool.classes.length, "size class", "size classes")}, ` +
       `${formatNumber(pool.used)} of ${counted(pool.used + pool.free, "record")} in use.`),
     makeFaults(pool));

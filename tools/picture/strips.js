@@ -39,10 +39,10 @@ function titleOf(bucket, record) {
   if (bucket.change === "went") return type === Type.used ? "Went with its bucket" : "Free, its bucket went";
   if (type === Type.used) return !isPair ? "In use" : was ? "In use, as before" : "Came into use";
   const served = bucket.isHead(record) ? ", served next" : "";
-  return `${isPair && was ? "Given back, free" : "Free"}${served}`;
+  return `${isPair && was ? "Freed" : "Free"}${served}`;
 }
 
-/** The elements that tell all about a record. */
+/** The elements that describe a record. */
 function describe(bucket, record) {
   const { type, next } = bucket.unpacked;
   const offset = bucket.offsetOf(record);
@@ -84,7 +84,7 @@ class BucketList {
     this.sizeClass = null; // the one that is shown alone
     this.sort = { column: bucketColumns[0], isDescending: false };
     this.rows = new Map(); // by place in this.items
-    this.cursor = null; // the record that the keyboard stands on, as is this.pointed for the pointer
+    this.cursor = null; // the record at the keyboard's focus, as this.pointed is that at the pointer
     this.pointed = null;
     this.head = make("div", { class: "row head", role: "row" });
     this.body = make("div", {
@@ -261,7 +261,7 @@ class BucketList {
     return column >= 0 && column < perLine && record >= 0 && record < bucket.count ? { bucket, record } : null;
   }
 
-  /** Moves one of the two marks, and shows what the last one stands on. */
+  /** Moves one of the two marks, and shows the record at the last one. */
   mark(which, place) {
     const old = this[which];
     if (old?.bucket === place?.bucket && old?.record === place?.record) return;
@@ -279,7 +279,7 @@ class BucketList {
   }
 
   point(event) {
-    // The page also moves below a pointer that stands still.
+    // The page also moves below a pointer that doesn't move.
     const isMoved = event.movementX !== 0 || event.movementY !== 0;
     if (isMoved && event.pointerType !== "touch") this.mark("pointed", this.under(event));
   }
@@ -352,7 +352,7 @@ class BucketList {
       case "PageDown": return this.beside(stay, 10);
       case "n": return this.orStay(stay, bucket.recordAt(bucket.unpacked.next[record]));
       case "h": return this.orStay(stay, bucket.recordAt(bucket.head));
-      case "d": return this.damagedBehind(stay);
+      case "d": return this.damagedAfter(stay);
       default: return null;
     }
   }
@@ -377,7 +377,7 @@ class BucketList {
     return { bucket: other, record: Math.min(line * grid.perLine + column, other.count - 1) };
   }
 
-  damagedBehind({ bucket, record }) {
+  damagedAfter({ bucket, record }) {
     const buckets = this.items.filter((item) => !item.isHeading).map((item) => item.bucket);
     const at = buckets.indexOf(bucket);
     for (let i = 0; i <= buckets.length; ++i) {

@@ -1,0 +1,76 @@
+// vokmempool picture: draws detailed reports as one page that a browser opens from a file.
+// Test: tests/tools/picture_test.py.
+#include "common/Commands.h"
+#include "common/Failure.h"
+#include "common/Files.h"
+#include "picture/Data.h"
+#include "report/Reader.h"
+
+#include <CLI/CLI.hpp>
+#include <filesystem>
+#include <fmt/format.h>
+#include <memory>
+
+namespace VOK::MemPool::Tools {
+
+namespace {
+
+struct Options {
+  std::string report, other, out;
+};
+
+bool IsPlain(const Report& report) {
+  return report.bucketReports.empty() && !report.buckets.rows.empty();
+}
+
+/// The reports of a file that have their records; those that lack them are named on the error
+/// stream, or are a failure if there is no other.
+PictureSource Read(const std::string& file) {
+  PictureSource source{
+      file == "-" ? "standard input" : std::filesystem::path(file).filename().string(), {}};
+  std::string plain;
+  for (Report& report : ReadReportFile(file))
+    if (IsPlain(report))
+      plain += fmt::format("{}: line {}: a plain report, which has no records to draw\n", file,
+                           report.line);
+    else
+      source.reports.push_back(std::move(report));
+  if (source.reports.empty())
+    throw Failure(plain.substr(0, plain.find('\n')) + "; DbgDetailed writes them");
+  for (std::size_t at = 0; at < plain.size(); at = plain.find('\n', at) + 1)
+    fmt::print(stderr, "vokmempool: {}\n", plain.substr(at, plain.find('\n', at) - at));
+  return source;
+}
+
+void Run(const Options& options) {
+  const PictureSource report = Read(options.report);
+  std::string data;
+  if (options.other.empty())
+    data = PictureData(nullptr, report);
+  else
+    data = PictureData(&report, Read(options.other));
+  const std::string page = fmt::format("{}{}{}", pageStart, data, pageEnd);
+  if (options.out == "-")
+    Print(page);
+  else
+    WriteFile(options.out, page);
+}
+
+} // namespace
+
+void AddPicture(CLI::App& app) {
+  const auto options = std::make_shared<Options>();
+  CLI::App* const command =
+      app.add_subcommand("picture", "Draws detailed reports as a page for the browser");
+  command->add_option("REPORT", options->report, "the output to read, - for standard input")
+      ->required();
+  command->add_option("OTHER", options->other, "a later output of the same process, to compare");
+  command->add_option("-o,--output", options->out, "the page to write, - for standard output")
+      ->required();
+  command->footer("Example: where do the records lie, and what has changed since?\n"
+                  "  ./program > out.txt; vokmempool picture out.txt -o pools.html\n"
+                  "  vokmempool picture before.txt after.txt -o change.html");
+  command->callback([options] { Run(*options); });
+}
+
+} // namespace VOK::MemPool::Tools

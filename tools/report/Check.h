@@ -1,0 +1,33 @@
+// Whether a report is consistent: each sum and each cross-reference that its text allows.
+// Test: tests/tools/tools_test.py.
+#ifndef VOK_MEMPOOL_TOOLS_REPORT_CHECK_H
+#define VOK_MEMPOOL_TOOLS_REPORT_CHECK_H
+
+#include "report/Model.h"
+
+#include <cstddef>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace VOK::MemPool::Tools {
+
+/// What an inconsistency is about. The indices are those of BUCKETS, which are those of the
+/// buckets' reports, and of a bucket's ALL RECORDS; a place of the whole pool or bucket has none.
+struct Place {
+  std::size_t line = 0;
+  std::optional<std::size_t> bucket = std::nullopt;
+  std::optional<std::size_t> record = std::nullopt;
+};
+
+struct Inconsistency {
+  Place place;
+  std::string text;
+};
+
+/// The inconsistencies of a report by line. A report of an undamaged pool has none.
+std::vector<Inconsistency> CheckReport(const Report& report);
+
+} // namespace VOK::MemPool::Tools
+
+#endif

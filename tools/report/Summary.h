@@ -1,0 +1,26 @@
+// The pools of a text side by side: what each holds, and what of that its callers use.
+// Test: tests/tools/tools_test.py.
+#ifndef VOK_MEMPOOL_TOOLS_REPORT_SUMMARY_H
+#define VOK_MEMPOOL_TOOLS_REPORT_SUMMARY_H
+
+#include "report/Model.h"
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+namespace VOK::MemPool::Tools {
+
+struct Bytes {
+  std::uint64_t held = 0;    ///< heap blocks of buckets and ext records, with their headers
+  std::uint64_t payload = 0; ///< data bytes of used records
+};
+
+Bytes BytesOf(const Report& report);
+
+/// A table with a row for each report.
+std::string Summarise(const std::vector<Report>& reports);
+
+} // namespace VOK::MemPool::Tools
+
+#endif

@@ -1,0 +1,113 @@
+#include "trace/Summary.h"
+
+#include <algorithm>
+#include <fmt/format.h>
+
+namespace VOK::MemPool::Tools {
+
+namespace {
+
+constexpr std::size_t shown = 20; // rows of a section that would be long
+
+std::string LineText(LineNumber line) {
+  return line == 0 ? "not in the trace" : fmt::format("line {}", line);
+}
+
+/// The first items, and the number of those that aren't shown.
+template <class Items, class Form>
+std::string Section(std::string_view title, const Items& items, std::uint64_t count, Form form) {
+  std::string text = fmt::format("\n{} ({})\n", title, count);
+  std::size_t rows = 0;
+  for (const auto& item : items) {
+    if (rows == shown) break;
+    text += fmt::format("  {}\n", form(item));
+    ++rows;
+  }
+  if (rows < count) text += fmt::format("  and {} more: --json has them\n", count - rows);
+  return text;
+}
+
+std::string PoolText(const TracedPool& pool, const PoolNames& names) {
+  std::string text = fmt::format(
+      "{}: construction {}, requests {}, freed {}, peak {} bytes, {} {} records of {} bytes",
+      NameOf(names, pool.addr), LineText(pool.made), pool.requests, pool.frees, pool.peakBytes,
+      pool.gone == 0 ? "live" : "left", pool.records, pool.bytes);
+  if (pool.uncertainRecords > 0)
+    text += fmt::format(", uncertain {} of {} bytes", pool.uncertainRecords, pool.uncertainBytes);
+  for (const ClearSpan& span : pool.clears.items)
+    text += fmt::format("\n    a Clear between line {} and line {}: its records of lines before {} "
+                        "are uncertain",
+                        span.after, span.before, span.before);
+  return text;
+}
+
+std::string Sizes(const TraceLedger& ledger) {
+  std::vector<std::pair<std::uint32_t, std::uint64_t>> sizes(ledger.requestsBySize.begin(),
+                                                             ledger.requestsBySize.end());
+  std::stable_sort(sizes.begin(), sizes.end(),
+                   [](const auto& a, const auto& b) { return a.second > b.second; });
+  return Section(
+      "requests by size, most frequent first", sizes, sizes.size(),
+      [](const auto& size) { return fmt::format("{:>10} bytes: {}", size.first, size.second); });
+}
+
+std::string Lifetimes(const TraceLedger& ledger) {
+  std::string text = "\nlifetimes in trace lines, from a request to its Free\n";
+  const std::uint64_t peak = *std::max_element(ledger.lifetimes.begin(), ledger.lifetimes.end());
+  for (std::size_t i = 0; i < ledger.lifetimes.size(); ++i) {
+    const std::uint64_t count = ledger.lifetimes[i];
+    if (count == 0) continue;
+    constexpr std::uint64_t width = 40;
+    const auto stars = static_cast<std::size_t>(std::max<std::uint64_t>(count * width / peak, 1));
+    text += fmt::format("  from {:>12}: {:>10} {}\n", std::uint64_t{1} << i, count,
+                        std::string(stars, '*'));
+  }
+  return text;
+}
+
+} // namespace
+
+std::string BareAddress(std::uint64_t addr) { return fmt::format("{:x}", addr); }
+
+std::string NameOf(const PoolNames& names, std::uint64_t addr) {
+  const auto found = names.find(addr);
+  return found == names.end() ? BareAddress(addr) : found->second;
+}
+
+std::string SummariseTrace(const TraceLedger& ledger, std::uint64_t numLines,
+                           const PoolNames& names) {
+  const std::vector<const TracedPool*> pools = ledger.GetLivePools();
+  const std::vector<TraceLedger::Live> live = ledger.GetLiveRecords();
+  std::string text = fmt::format("{} lines, {} of them trace lines\n", numLines, ledger.numEvents);
+  text += fmt::format("pools: {} constructed, {} destroyed, {} live at the end\n", ledger.numMade,
+                      ledger.gone.count, pools.size());
+  text +=
+      fmt::format("peak of live bytes: {} at {}{}\n", ledger.peakBytes, LineText(ledger.peakLine),
+                  ledger.numClears > 0 ? ", at most: a Clear has no line" : "");
+  text += Section("live pools", pools, pools.size(),
+                  [&](const TracedPool* pool) { return PoolText(*pool, names); });
+  text +=
+      Section("destroyed pools", ledger.gone.items, ledger.gone.count, [&](const TracedPool& pool) {
+        return fmt::format("destruction {}: {}", LineText(pool.gone), PoolText(pool, names));
+      });
+  text += Section("live records at the end", live, live.size(), [&](const auto& record) {
+    return fmt::format("line {}: {} bytes at {} of {}{}", record.line, record.size,
+                       BareAddress(record.data), NameOf(names, record.pool),
+                       record.isUncertain ? ", uncertain: a Clear follows it" : "");
+  });
+  text += Sizes(ledger) + Lifetimes(ledger);
+  text +=
+      Section("freed pointers that were not live in their pool", ledger.refused.items,
+              ledger.refused.count, [&](const RefusedFree& free) {
+                return fmt::format("line {}: {} to {}{}", free.line, BareAddress(free.data),
+                                   NameOf(names, free.pool),
+                                   free.owner == 0 ? "" : ", live in " + NameOf(names, free.owner));
+              });
+  text += Section("skipped lines, which are mixed or cut", ledger.mixed.items, ledger.mixed.count,
+                  [](const MixedLine& line) {
+                    return fmt::format("line {}: {}", line.line, OneLine(line.text));
+                  });
+  return text;
+}
+
+} // namespace VOK::MemPool::Tools

@@ -1,0 +1,34 @@
+// The result of reading a trace, as a text and as JSON.
+// Test: tests/tools/tools_test.py.
+#ifndef VOK_MEMPOOL_TOOLS_TRACE_SUMMARY_H
+#define VOK_MEMPOOL_TOOLS_TRACE_SUMMARY_H
+
+#include "trace/Ledger.h"
+
+#include <functional>
+#include <map>
+#include <string>
+#include <string_view>
+
+namespace VOK::MemPool::Tools {
+
+/// The names that the user gives to pools, by address.
+using PoolNames = std::map<std::uint64_t, std::string>;
+
+/// A pool's address as the trace shows it.
+std::string BareAddress(std::uint64_t addr);
+
+/// A pool's name, or its address if it has none.
+std::string NameOf(const PoolNames& names, std::uint64_t addr);
+
+/// `numLines` is the number of all lines of the text.
+std::string SummariseTrace(const TraceLedger& ledger, std::uint64_t numLines,
+                           const PoolNames& names);
+
+/// Writes a JSON document in pieces. docs/tools.md documents the form.
+void WriteTraceJson(const TraceLedger& ledger, std::uint64_t numLines, const PoolNames& names,
+                    const std::function<void(std::string_view)>& write);
+
+} // namespace VOK::MemPool::Tools
+
+#endif
