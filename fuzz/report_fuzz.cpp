@@ -1,5 +1,5 @@
-// Hostile text for the reader of reports: what it takes, it gives back byte for byte, by way of
-// JSON too, and draws it; all else it refuses. A text that starts with a brace is taken for a
+// Hostile text for the reader of reports: it writes each accepted text again byte for byte, also
+// through JSON, and draws it; it refuses all others. A text that starts with a brace is read as a
 // document.
 #include "Target.h"
 #include "common/Failure.h"

@@ -120,7 +120,8 @@ CHANGES = [
     (" 12.500%", "  12.50%"), ("+---------+\n", "+\n"), ("| FREE    | \n", 2 * "| FREE    " + "| \n"),
     ("#002\n", "#2\n"), ("#002\n", "#0002\n"), ("Next1       :        0", "Next1       :      0x0"),
     ("Exp $\n", "Exp $\r\n"), ("MemPool::Mgr", "MemPool::Mgr x\nMemPool::Mgr"),
-    ("2e8 \n\n", "2e8 \nWARNING:../s/MemPool:  110: Number of recs 7 < 8\n\n"),
+    ("\n   MemPool::Bucket #001 USED", "WARNING:../s/MemPool:  110: Number of recs 7 < 8\n"
+     "\n   MemPool::Bucket #001 USED"),
     (" 0 \n\n\n   MemPool::Bucket #002", " 0 \nWARNING:../s/MemPool:12345: Too many free recs "
      "7 > 6\n\n\n   MemPool::Bucket #002"),
 ]

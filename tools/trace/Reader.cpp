@@ -1,11 +1,12 @@
 #include "trace/Reader.h"
 
+#include "MemPool"
+
 namespace VOK::MemPool::Tools {
 
 namespace {
 
 constexpr std::string_view prefix = "zvpt:";
-constexpr std::uint32_t maxRequest = 1073741823; // the library serves no larger one
 
 /// Takes values from the start of a text, by hand, because each line needs it.
 class Taker {
