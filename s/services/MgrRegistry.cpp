@@ -27,6 +27,7 @@ alignas(Map) std::byte storage[sizeof(Map)];
 Map& Registry() { return *std::launder(reinterpret_cast<Map*>(storage)); }
 
 std::mutex mutex;
+using Lock = std::lock_guard<std::mutex>;
 
 std::atomic<std::uint32_t> nextMgrId = 1;
 
@@ -43,23 +44,23 @@ void Begin() {
 
 void End() noexcept {
   Map left;
-  const std::lock_guard lock(mutex);
+  const Lock lock(mutex);
   left.swap(Registry());
 }
 
 bool Contains(std::string_view name) {
-  const std::lock_guard lock(mutex);
+  const Lock lock(mutex);
   return Registry().find(name) != Registry().end();
 }
 
 Mgr* Find(std::string_view name) {
-  const std::lock_guard lock(mutex);
+  const Lock lock(mutex);
   const auto entry = Registry().find(name);
   return entry != Registry().end() ? HandleOf(entry->second) : nullptr;
 }
 
 unsigned Count() {
-  const std::lock_guard lock(mutex);
+  const Lock lock(mutex);
   return static_cast<unsigned>(Registry().size());
 }
 
@@ -68,7 +69,7 @@ std::vector<Mgr*> Handles() {
   std::vector<Mgr*> handles;
   while (true) {
     handles.reserve(Count());
-    const std::lock_guard lock(mutex);
+    const Lock lock(mutex);
     if (Registry().size() > handles.capacity()) continue;
     for (const auto& [name, pool] : Registry())
       handles.push_back(HandleOf(pool));
@@ -79,14 +80,14 @@ std::vector<Mgr*> Handles() {
 bool Enter(const std::string& name, BucketMgr* pool) {
   Map made;
   made.emplace(name, pool);
-  const std::lock_guard lock(mutex);
+  const Lock lock(mutex);
   Registry().merge(made);
   return made.empty();
 }
 
 void Remove(std::string_view name) noexcept {
   Map::node_type gone;
-  const std::lock_guard lock(mutex);
+  const Lock lock(mutex);
   const auto entry = Registry().find(name);
   if (entry != Registry().end()) gone = Registry().extract(entry);
 }
