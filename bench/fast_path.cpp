@@ -1,6 +1,6 @@
 // The fast path of a request alone: pairs of Alloc and Free of one record, over 4,000 live records
 // under the default settings.
-//   pair/N   N pairs; scripts/count-instructions takes the difference of two N
+//   pair/N   N pairs; scripts/checks/fast-path takes the difference of two N
 #include <MemPool>
 
 #include <benchmark/benchmark.h>

@@ -1,6 +1,6 @@
 // The attributes that keep the fast path straight-line code: what every request runs is inlined
 // into one piece, what few requests run is out of line and is reached by a tail call.
-// Test: scripts/check-fast-path.
+// Test: scripts/checks/fast-path.
 #ifndef VOK_MEMPOOL_ATTRIBUTES_H
 #define VOK_MEMPOOL_ATTRIBUTES_H
 

@@ -1,7 +1,7 @@
 // The library's start and end: all its load-time objects, in their order, in the one unit that has
 // an initialiser. A client runs after them, since a library is initialised before its users;
 // nothing else ensures that the registry and the settings exist before the first Mgr.
-// Test: tests/process_test.py, scripts/check-library.
+// Test: tests/process_test.py, scripts/checks/library.
 #include "services/MgrRegistry.h"
 #include "services/Observers.h"
 #include "services/Output.h"

@@ -10,7 +10,6 @@ import tempfile
 from contextlib import chdir
 from pathlib import Path
 
-sys.path.insert(0, str(Path(__file__).resolve().parents[2] / "scripts"))
 from browser import Browser
 from support import Work, data_of, same, tool
 
