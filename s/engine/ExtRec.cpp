@@ -16,8 +16,8 @@ ExtRec* ExtRec::Create(std::uint32_t size) {
 void ExtRec::Destroy(ExtRec* e) noexcept { ::operator delete[](e); }
 
 // A pointer that no bucket and no list knows may start its heap block, so what lies before it
-// is not ours: the address sanitizer must not judge these reads. They go byte by byte, since it
-// would judge memcpy, and stop at the first that differs.
+// is not ours: the address sanitizer must not check these reads. They go byte by byte, since it
+// would check memcpy, and stop at the first that differs.
 __attribute__((no_sanitize_address)) ExtRec* ExtRec::FromData(const void* p) {
   if (p == nullptr) return nullptr;
   const auto* const end = static_cast<const std::uint8_t*>(p);

@@ -1,4 +1,4 @@
-// What each memory-checking tool is told, in its own terms. None is a dependency: memcheck is
+// What the library reports to each memory-checking tool. None is a dependency: memcheck is
 // reached by a sequence of instructions that means nothing outside of it, the others by names that
 // stay null where no tool defines them. Test: tests/process_test.py.
 #include "services/Observers.h"

@@ -53,7 +53,7 @@ void RecordMade(const void* block, void* p, std::size_t size, std::size_t capaci
 /// The caller holds the record no longer.
 void RecordGone(const void* block, void* p, std::size_t capacity);
 
-/// While it lives, memcheck judges nothing that this thread does: for the library's own accesses to
+/// While it lives, memcheck reports no error of this thread: for the library's own accesses to
 /// headers, which are inaccessible. It lives for no call on the heap of a disabled pool.
 class Quiet {
 public:
