@@ -65,7 +65,7 @@ std::vector<SizeClass> Mgr::GetSizeClasses() const {
   return classes;
 }
 
-// Memcheck goes on judging the program's function.
+// Memcheck still reports errors in the program's function.
 void Mgr::VisitRecords(void (*visit)(void* context, void* data, unsigned size),
                        void* context) const {
   ForEachGroup(*bucketMgr, [&](const Group& group, std::uint32_t) {

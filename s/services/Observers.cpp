@@ -35,7 +35,7 @@ enum Request : std::uintptr_t {
   DestroyPool = 0x1304,
   PoolAlloc = 0x1305,
   PoolFree = 0x1306,
-  ChangeJudging = 0x1801,
+  ChangeReporting = 0x1801,
   MakeNoAccess = 0x4D430000, // 'M', 'C': of memcheck alone
   MakeDefined = 0x4D430002,
 };
@@ -163,9 +163,9 @@ void RecordGone(const void* block, void* p, std::size_t capacity) {
   Heaptrack::Gone(p);
 }
 
-void Quiet::Judge(bool judging) {
-  Memcheck::Tell(Memcheck::ChangeJudging,
-                 reinterpret_cast<const void*>(judging ? std::uintptr_t(-1) : std::uintptr_t(1)));
+void Quiet::SetReporting(bool reports) {
+  Memcheck::Tell(Memcheck::ChangeReporting,
+                 reinterpret_cast<const void*>(reports ? std::uintptr_t(-1) : std::uintptr_t(1)));
 }
 
 } // namespace VOK::MemPool::Observers

@@ -59,17 +59,17 @@ class Quiet {
 public:
   Quiet() : quiet(Present()) {
     if (quiet) [[unlikely]]
-      Judge(false);
+      SetReporting(false);
   }
   ~Quiet() {
     if (quiet) [[unlikely]]
-      Judge(true);
+      SetReporting(true);
   }
   Quiet(const Quiet&) = delete;
   Quiet& operator=(const Quiet&) = delete;
 
 private:
-  static void Judge(bool judging);
+  static void SetReporting(bool reports);
 
   const bool quiet;
 };
