@@ -2,7 +2,6 @@
 // sequence of calls. VOK_MEMPOOL_SEED and VOK_MEMPOOL_STEPS in the environment set the random run.
 #include "support/Operations.h"
 
-#include <cstdlib>
 #include <gtest/gtest.h>
 #include <random>
 

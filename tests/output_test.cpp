@@ -2,7 +2,6 @@
 // they change of the stream, its buffer and the heap. The preset tsan runs the cases with threads.
 #include "support/Process.h"
 
-#include "MemPool"
 #include "base/PointerText.h"
 #include "diagnostics/ReportText.h"
 #include "engine/Bucket.h"
@@ -15,9 +14,7 @@
 #include <atomic>
 #include <gmock/gmock.h>
 #include <iomanip>
-#include <iostream>
 #include <random>
-#include <sstream>
 #include <thread>
 
 using namespace VOK::MemPool;
@@ -32,28 +29,6 @@ __attribute__((noinline)) void operator delete(void* p) noexcept { std::free(p);
 __attribute__((noinline)) void operator delete(void* p, std::size_t) noexcept { std::free(p); }
 
 namespace {
-
-/// Takes the place of a stream's buffer while it lives. The stream throws what it can.
-struct Buffer : std::streambuf {
-  explicit Buffer(std::ostream& stream_) : stream(stream_), before(stream_.rdbuf(this)) {
-    format.copyfmt(stream);
-    stream.exceptions(std::ios::badbit | std::ios::failbit);
-    text.reserve(1000);
-  }
-  ~Buffer() override {
-    stream.copyfmt(format);
-    stream.rdbuf(before);
-  }
-  void imbue(const std::locale&) override { text += "imbued"; }
-  int_type overflow(int_type c) override { return text += dead ? throw 1 : char(c), c; }
-  int sync() override { return ++numFlushes, dead ? throw 1 : 0; }
-
-  std::ostream& stream;
-  std::streambuf* const before;
-  std::ios format{nullptr};
-  std::string text;
-  unsigned numFlushes = 0;
-};
 
 TEST(OutputLine, HasTheTextOfInsertions) {
   std::mt19937_64 random;
@@ -88,15 +63,15 @@ TEST(OutputLine, HasTheTextOfInsertions) {
 TEST(OutputLine, ChangesNothingButAPendingWidth) {
   for (const bool dies : {false, true}) {
     std::ostringstream tied;
-    Buffer tiedBuffer(tied);
-    Buffer buffer(std::cout);
+    Output tiedOutput(tied);
+    Output output;
+    Output errors(std::cerr);
     const std::locale locale = Grouping();
     std::cout.imbue(locale);
-    buffer.text.clear();
+    EXPECT_EQ(output.Text(), "imbued");
     std::cout << std::hex << std::setfill('*') << std::setw(9);
     std::cout.tie(&tied);
     const std::ios::fmtflags flags = std::cout.flags();
-    const Buffer errors(std::cerr);
     const unsigned before = numAllocations;
     dead = dies;
     EXPECT_NO_THROW(Trace::Freed(nullptr, nullptr));
@@ -104,9 +79,9 @@ TEST(OutputLine, ChangesNothingButAPendingWidth) {
     EXPECT_THROW(Messages::RefuseLoad({"reason ", 7u}), const char*);
     dead = false;
     EXPECT_EQ(numAllocations, before);
-    EXPECT_EQ(buffer.text, dies ? "" : "****zvpt:f:0:0:\nWARNING:../s/MemPool:a.b.c: 1.2.3\n");
-    EXPECT_THAT(errors.text, testing::EndsWith(dies ? "" : ": reason 7\n"));
-    EXPECT_EQ(tiedBuffer.numFlushes, 2u);
+    EXPECT_EQ(output.Text(), dies ? "" : "****zvpt:f:0:0:\nWARNING:../s/MemPool:a.b.c: 1.2.3\n");
+    EXPECT_THAT(errors.Text(), testing::EndsWith(dies ? "" : ": reason 7\n"));
+    EXPECT_EQ(tiedOutput.numFlushes, 2u);
     EXPECT_TRUE(std::cout.good() && std::cout.flags() == flags && std::cout.width() == 0 &&
                 std::cout.fill() == '*' && std::cout.getloc() == locale && tied.good());
   }

@@ -1,17 +1,8 @@
-#include "support/ArenaHeap.h"
-#include "support/Process.h"
+#include "support/Pools.h"
 
-#include "MemPool"
-#include "engine/BucketMgr.h"
 #include "services/MgrRegistry.h"
 
-#include <algorithm>
-#include <cstring>
-#include <gtest/gtest.h>
-#include <new>
 #include <optional>
-
-using namespace VOK::MemPool;
 
 namespace {
 
@@ -62,13 +53,12 @@ TEST(Registry, PoolsByName) {
 
 // A number never comes again: not after its pool is gone, nor where the pool ran out of memory, at
 // whichever of its allocations, and then nothing is left of it.
-TEST(Registry, AutomaticNames) {
+TEST_F(Pools, AutomaticNames) {
   EXPECT_EQ(firstName, "__VOK_MEMPOOL_00001");
   unsigned long number = NextNumber();
   const auto nextName = [&number] {
     return "__VOK_MEMPOOL_" + std::to_string(++number + 100000).substr(1);
   };
-  ArenaHeap heap;
   unsigned numFailed = 0;
   for (bool done = false; !done; ++numFailed) {
     heap.FailAt(numFailed + 1);
@@ -83,7 +73,7 @@ TEST(Registry, AutomaticNames) {
     } catch (const std::bad_alloc&) {
       ++number;
     }
-    EXPECT_EQ(heap.Finish(), std::vector<std::string>());
+    EXPECT_THAT(heap.Finish(), testing::IsEmpty());
     EXPECT_EQ(GetNumMgrs(), 0u);
   }
   EXPECT_GT(numFailed, 8u);

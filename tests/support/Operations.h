@@ -3,14 +3,12 @@
 #ifndef VOK_MEMPOOL_TESTS_OPERATIONS_H
 #define VOK_MEMPOOL_TESTS_OPERATIONS_H
 
-#include "support/Process.h"
 #include "support/Reference.h"
 
 #include "engine/BucketMgr.h"
 #include "engine/Invariants.h"
 #include "services/Observers.h"
 
-#include <functional>
 #include <optional>
 
 class Operations {
