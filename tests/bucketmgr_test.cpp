@@ -146,22 +146,17 @@ TEST_F(Pools, IsValidSeesEachDamage) {
         }
         field = old;
       };
-  for (std::uint16_t value = 0; value < 256; ++value) {
-    for (std::uint8_t* byte :
-         {p[3] - 4, p[3] - 2, p[4] - 4, p[4] - 2, &last.tag0, &last.tag1, &last.type, &last.tag3})
-      damage(*byte, {static_cast<std::uint8_t>(value)});
-    for (std::uint16_t* number :
-         {&partly.recsSize, &partly.recSize, &partly.freeHead, &partly.freeRecs, &full.freeHead})
-      damage(*number, {value});
-  }
-  for (std::uint32_t* number :
-       {&group.numBuckets, &group.numFreeBuckets, &pool.numGroups, &pool.numExtRecs})
-    damage(*number, {*number - 1, *number + 1});
+  // From the first field to the last byte, each of which can have any wrong value.
+  const std::pair<void*, std::size_t> bytes[] = {
+      {p[3] - 4, 3},       {p[4] - 4, 3},        {&last.tag0, 4},        {&partly.recsSize, 8},
+      {&full.freeHead, 2}, {&pool.numGroups, 8}, {&group.numBuckets, 8}, {&pool.maxRecSize, 8}};
+  for (const auto& [first, size] : bytes)
+    for (std::size_t i = 0; i < size; ++i)
+      for (int value = 0; value < 256; ++value)
+        damage(static_cast<std::uint8_t*>(first)[i], {static_cast<std::uint8_t>(value)});
   for (Bucket** link : {&partly.prev1, &partly.next1, &partly.prev2, &partly.next2, &empty.prev2,
                         &group.head2, &group.tail1})
     damage(*link, {&full, &partly});
-  damage(pool.minRecSize, {4, 7, 20});
-  damage(pool.maxRecSize, {4, 17, 20});
   damage(pool.bucketSize, {19, 25});
   damage(partly.parent, {&group + 1});
   damage(const_cast<BucketMgr*&>(group.owner), {nullptr});

@@ -45,6 +45,11 @@ ON=* BUCKET_SIZE=1003 : set min=2000; pool a -> ERROR 1: maximum (1000>999) [100
 ON=* : set min=1001; pool a -> ERROR 2: minimum (1004>1000); status 1
 ON=* : set min=4294967295; pool a -> ERROR 2: minimum (4294967296>1000); status 1
 
+# Pools by name, none of which is one, too.
+ON=* : names; find a; find; pool b; pool D; pool; pool ab; pool a; names; find a; find A; find d;
+    find; drop; find a; pool a; find a
+    -> 0 of 1:; 0; 0; 5 of 10:  D a ab b; 4; 5; 5; 2; 4; 4
+
 # The last values that fit.
 ON=* : pool a; drop; pool a; alloc 1; free 0; alloc 1073741823; drop -> freed
 ON=* BUCKET_SIZE=70000 : set max=65531; pool a; alloc 65524; free 0 -> freed
@@ -52,21 +57,21 @@ ON=* BUCKET_SIZE=70000 : set max=65531; pool a; alloc 65524; free 0 -> freed
 # An ERROR line is whole before the exit, which runs what is queued for it.
 TRACE=1 ZOR_STATIC_POOLS=1 : pool a; set max=3; pool b | names
     -> zvpt:c:@1; zvpt:c:@2; zvpt:c:@3; zvpt:c:@4; ERROR 1: minimum (8>0);
-    3 pools: __VOK_MEMPOOL_00001 a client; zvpt:d:@2; zvpt:d:@1; status 1
+    3 of 6: __VOK_MEMPOOL_00001 a client; zvpt:d:@2; zvpt:d:@1; status 1
 ON=* TRACE=1 : pool a; alloc 1073741824 | cut -> zvpt:c:@1; ERROR 2: limit 1073741824; status 7
 
 # A library's static pools, and the pools that its unloading leaves.
 pool_host ON=1 TRACE=1 ZOR_STATIC_POOLS=1 : open client; pool a; close; open client; pool b; names
     -> zvpt:c:@1; zvpt:c:@2; zvpt:c:@3; zvpt:d:@2; zvpt:d:@1; zvpt:c:@4; zvpt:c:@5; zvpt:c:@6;
-    3 pools: __VOK_MEMPOOL_00001 b client; zvpt:d:@5; zvpt:d:@4
+    3 of 6: __VOK_MEMPOOL_00001 b client; zvpt:d:@5; zvpt:d:@4
 """
 
 # The registry's end comes first, and a pool still serves. A failed load at run time throws its text,
 # and the library stays, with the settings as read. Each key is looked up once, in its order.
 ON_LINUX = """
-pool_host ON=1 TRACE=1 ZOR_STATIC_POOLS=1 : open client; pool a | names; alloc 10; free 0; drop
-    -> zvpt:c:@1; zvpt:c:@2; zvpt:c:@3; zvpt:d:@2; zvpt:d:@1; 0 pools:; zvpt:a:@3:@4:10;
-    zvpt:f:@3:@4:; freed; zvpt:d:@3
+pool_host ON=1 TRACE=1 ZOR_STATIC_POOLS=1 : open client; pool a | names; alloc 10; free 0; drop;
+    pool a; names -> zvpt:c:@1; zvpt:c:@2; zvpt:c:@3; zvpt:d:@2; zvpt:d:@1; 0 of 1:; zvpt:a:@3:@4:10;
+    zvpt:f:@3:@4:; freed; zvpt:d:@3; zvpt:c:@5; 1 of 2: a
 pool_host MIN_RECORD_SIZE=1000 ON=1 TRACE=1 : grouping; open library; open client; nameless;
     alloc 10 -> EXCEPTION 1: (1000>=1000); zvpt:c:@1; zvpt:a:@1:@2:10; !EXCEPTION 1: (1000>=1000)
 ZOR_SHOW_KEYS=1 ON=0 : -> ON; ZOR_MEMPOOL_ON; TRACE; BUCKET_SIZE; MAX_RECORD_SIZE;
@@ -78,7 +83,7 @@ ZOR_SHOW_KEYS=1 ON=1 : -> ON; TRACE; BUCKET_SIZE; MAX_RECORD_SIZE; MIN_RECORD_SI
 # A program's handlers run ahead of any library's, and a load throws nothing to its caller.
 ON_WINDOWS = """
 pool_host ON=1 TRACE=1 ZOR_STATIC_POOLS=1 : open client; pool a | names; alloc 10; free 0; drop
-    -> zvpt:c:@1; zvpt:c:@2; zvpt:c:@3; 3 pools: __VOK_MEMPOOL_00001 a client; zvpt:a:@3:@4:10;
+    -> zvpt:c:@1; zvpt:c:@2; zvpt:c:@3; 3 of 6: __VOK_MEMPOOL_00001 a client; zvpt:a:@3:@4:10;
     zvpt:f:@3:@4:; freed; zvpt:d:@3; zvpt:d:@2; zvpt:d:@1
 pool_host MIN_RECORD_SIZE=1000 : open library -> !EXCEPTION 1: (1000>=1000); aborted
 """

@@ -2,59 +2,13 @@
 
 #include "services/MgrRegistry.h"
 
-#include <optional>
-
 namespace {
 
-// Before main, so that it is the first of the process.
-const std::string firstName = MgrRegistry::NextAutomaticName();
-
 unsigned long NextNumber() { return std::stoul(MgrRegistry::NextAutomaticName().substr(14)); }
-
-/// By both lists, which append to what is in them.
-std::vector<Mgr*> AllMgrs() {
-  std::vector<Mgr*> mgrs{nullptr};
-  GetMgrs(mgrs);
-  VOK::vector<Mgr*> own;
-  own.Append(nullptr);
-  GetMgrs(own);
-  EXPECT_TRUE(std::ranges::equal(own, mgrs) && mgrs[0] == nullptr);
-  EXPECT_EQ(own.capacity, std::max(1u, 2 * GetNumMgrs())); // room for that many, then doubled
-  mgrs.erase(mgrs.begin());
-  EXPECT_EQ(GetNumMgrs(), mgrs.size());
-  return mgrs;
-}
-
-TEST(Registry, PoolsByName) {
-  EXPECT_EQ(AllMgrs(), std::vector<Mgr*>());
-  EXPECT_TRUE(GetMgr("a") == nullptr && GetMgr(nullptr) == nullptr);
-  Mgr b("b");
-  std::optional<Mgr> a("a");
-  Mgr capital("D");
-  EXPECT_TRUE(GetMgr("a") == &*a && GetMgr("A") == nullptr && GetMgr("d") == nullptr);
-  EXPECT_TRUE(GetMgr("") == nullptr && GetMgr(nullptr) == nullptr);
-  Mgr empty("");
-  Mgr ab("ab");
-  EXPECT_TRUE(GetMgr("") == &empty && GetMgr(nullptr) == &empty);
-  EXPECT_EQ(AllMgrs(), (std::vector{&empty, &capital, &*a, &ab, &b}));
-  a.reset();
-  EXPECT_EQ(GetMgr("a"), nullptr);
-  Mgr again("a");
-  EXPECT_EQ(GetMgr("a"), &again);
-  EXPECT_STREQ(again.GetName(), "a");
-  EXPECT_EQ(again.GetBucketMgr()->name, "a");
-
-  MgrRegistry::End();
-  EXPECT_EQ(AllMgrs(), std::vector<Mgr*>());
-  Mgr late("a");
-  { const Mgr pool("c"); }
-  EXPECT_EQ(AllMgrs(), std::vector{&late});
-}
 
 // A number never comes again: not after its pool is gone, nor where the pool ran out of memory, at
 // whichever of its allocations, and then nothing is left of it.
 TEST_F(Pools, AutomaticNames) {
-  EXPECT_EQ(firstName, "__VOK_MEMPOOL_00001");
   unsigned long number = NextNumber();
   const auto nextName = [&number] {
     return "__VOK_MEMPOOL_" + std::to_string(++number + 100000).substr(1);

@@ -3,16 +3,8 @@
 // library, and as a host, which is linked with neither and loads them.
 #include "support/Process.h"
 
-#include <MemPool>
-
-#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
-#include <cstring>
-#include <iostream>
-#include <memory>
-#include <new>
-#include <vector>
 
 #ifdef _WIN32
 #include <windows.h>
@@ -34,6 +26,7 @@ struct State {
   Mgr& Pool() { return *pools.back(); }
   unsigned Number() const { return static_cast<unsigned>(std::stoul(operand)); }
   void*& Block() { return blocks[Number()]; }
+  const char* Name() const { return operand.empty() ? nullptr : operand.c_str(); }
 
   std::vector<Mgr*> pools;
   std::vector<void*> blocks; // by their numbers in the order of requests
@@ -78,12 +71,17 @@ void Build(State& s) {
 // The compiler must not drop a write that nobody reads.
 void Write(State& s) { static_cast<volatile char*>(s.blocks.back())[std::stol(s.operand)] = 2; }
 
+// By both lists, which append to what is in them.
 void ShowNames(State&) {
-  std::vector<Mgr*> mgrs;
+  std::vector<Mgr*> mgrs(1);
   GetMgrs(mgrs);
-  std::cout << GetNumMgrs() << " pools:";
-  for (const Mgr* mgr : mgrs)
-    std::cout << ' ' << mgr->GetName();
+  VOK::vector<Mgr*> own;
+  own.Append(nullptr);
+  GetMgrs(own);
+  std::cout << GetNumMgrs() << " of " << own.capacity
+            << (std::ranges::equal(own, mgrs) ? ":" : "?");
+  for (std::size_t i = 1; i < mgrs.size(); ++i)
+    std::cout << ' ' << mgrs[i]->GetName();
   std::cout << std::endl;
 }
 #endif
@@ -99,9 +97,12 @@ constexpr struct {
     {"close", [](State&) { dlclose(handle), actOfClient = nullptr; }},
 #ifndef VOK_MEMPOOL_HOST
     {"set", [](State& s) { Set(s.operand); }},
-    {"pool", [](State& s) { s.pools.push_back(new Mgr(s.operand.c_str())); }},
+    {"pool", [](State& s) { s.pools.push_back(new Mgr(s.Name())); }},
     {"nameless", [](State& s) { s.pools.push_back(new Mgr); }},
-    {"turn", [](State& s) { std::reverse(s.pools.begin(), s.pools.end()); }},
+    {"find",
+     [](State& s) {
+       std::cout << std::ranges::find(s.pools, GetMgr(s.Name())) - s.pools.begin() << '\n';
+     }},
     {"drop", [](State& s) { delete &s.Pool(), s.pools.pop_back(); }},
     {"build", Build},
     {"clear", [](State& s) { s.Pool().Clear(); }},
