@@ -26,7 +26,6 @@ struct State {
   Mgr& Pool() { return *pools.back(); }
   unsigned Number() const { return static_cast<unsigned>(std::stoul(operand)); }
   void*& Block() { return blocks[Number()]; }
-  const char* Name() const { return operand.empty() ? nullptr : operand.c_str(); }
 
   std::vector<Mgr*> pools;
   std::vector<void*> blocks; // by their numbers in the order of requests
@@ -71,6 +70,12 @@ void Build(State& s) {
 // The compiler must not drop a write that nobody reads.
 void Write(State& s) { static_cast<volatile char*>(s.blocks.back())[std::stol(s.operand)] = 2; }
 
+// Where the pool of that name is in the list of this program; null is a name, too.
+void Find(State& s) {
+  const char* const name = s.operand.empty() ? nullptr : s.operand.c_str();
+  std::cout << std::ranges::find(s.pools, GetMgr(name)) - s.pools.begin() << '\n';
+}
+
 // By both lists, which append to what is in them.
 void ShowNames(State&) {
   std::vector<Mgr*> mgrs(1);
@@ -97,12 +102,9 @@ constexpr struct {
     {"close", [](State&) { dlclose(handle), actOfClient = nullptr; }},
 #ifndef VOK_MEMPOOL_HOST
     {"set", [](State& s) { Set(s.operand); }},
-    {"pool", [](State& s) { s.pools.push_back(new Mgr(s.Name())); }},
+    {"pool", [](State& s) { s.pools.push_back(new Mgr(s.operand.c_str())); }},
     {"nameless", [](State& s) { s.pools.push_back(new Mgr); }},
-    {"find",
-     [](State& s) {
-       std::cout << std::ranges::find(s.pools, GetMgr(s.Name())) - s.pools.begin() << '\n';
-     }},
+    {"find", Find},
     {"drop", [](State& s) { delete &s.Pool(), s.pools.pop_back(); }},
     {"build", Build},
     {"clear", [](State& s) { s.Pool().Clear(); }},
