@@ -1,6 +1,6 @@
-// The texts of the reports, to the blank: golden texts of whole reports, and of what the state of
-// the stream or a damage changes in them. The pools stand on an arena, so that addresses are the
-// same in every run.
+// The texts of the reports, to the space: golden texts of whole reports, and of what the state of
+// the stream or a damage changes in them. The pools are on an arena, so that addresses are the same
+// in every run.
 #include "support/Pools.h"
 
 #include "engine/Bucket.h"
@@ -111,12 +111,13 @@ TEST_F(Reports, AllPools) {
   Alloc(unused, 99, 9);
   Alloc(unused, 50, 40);
   BucketMgr* const own = disabled.GetBucketMgr();
-  disabled = emptied;
+  EXPECT_TRUE(&(disabled = emptied) == &disabled && GetMgr("disabled") == &disabled);
+  EXPECT_TRUE(own->mgr == &disabled && disabled.GetName() == std::string("emptied"));
   ExpectGolden("all-detailed", Report([] { DbgDetailed(); }));
   std::memcpy(static_cast<void*>(&disabled), &own, sizeof(Mgr));
 }
 
-// The state under which a report starts is part of its text, and some of it stays behind.
+// The state under which a report starts is part of its text, and some of it stays.
 TEST_F(Reports, StateOfTheStream) {
   const std::pair<const char*, void (*)(std::ostream&)> states[] = {
       {"left, fill #", [](std::ostream& os) { os << std::left << std::setfill('#'); }},

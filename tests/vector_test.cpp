@@ -7,12 +7,12 @@ using Vector = VOK::vector<std::uint32_t>;
 static_assert(offsetof(Vector, elems) == 0 && offsetof(Vector, count) == sizeof(void*) &&
               offsetof(Vector, capacity) == sizeof(void*) + 4);
 
-// Each block is of the exact size, and the old one is released after the copying. Where memory runs
+// Each block is of the exact size, and the old one is freed after the copying. Where memory runs
 // out nothing has changed.
 TEST_F(Pools, VectorGrowsByItsRules) {
+  std::vector<std::uint32_t> expected;
   {
     Vector v;
-    std::vector<std::uint32_t> expected;
     // Appends a new number or, of the block that goes, an own one; or reserves as many.
     for (const char step : std::string("0nnnno8;3nnnnnnn")) {
       const std::uint32_t number = step == 'o' ? v[1] : 100 + v.count;
