@@ -7,12 +7,12 @@ namespace {
 // A number is never used again: not after its pool is gone, nor where the pool ran out of memory,
 // at whichever of its allocations, and then nothing is left of it.
 TEST_F(Pools, AutomaticNames) {
-  const GroupingLocale locale;
+  const std::locale before = std::locale::global(Grouping());
   unsigned long number = std::stoul(MgrRegistry::NextAutomaticName().substr(14));
   const auto expectNext = [&](const std::string& name) {
-    const std::string digits = std::to_string(++number);
-    EXPECT_EQ(name, "__VOK_MEMPOOL_" +
-                        std::string("00000", digits.size() < 5 ? 5 - digits.size() : 0) + digits);
+    char expected[40];
+    std::snprintf(expected, sizeof expected, "__VOK_MEMPOOL_%05lu", ++number);
+    EXPECT_EQ(name, expected);
   };
   unsigned k = 0;
   for (bool done = false; !done;) {
@@ -35,6 +35,7 @@ TEST_F(Pools, AutomaticNames) {
   expectNext(Mgr().GetName());
   while (number < 100010)
     expectNext(MgrRegistry::NextAutomaticName());
+  std::locale::global(before);
 }
 
 } // namespace

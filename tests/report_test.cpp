@@ -169,21 +169,18 @@ TEST_F(Reports, DamagedBucket) {
   std::ostringstream before;
   Write(pool, before);
 
-  using Fields = std::map<std::string, std::uint16_t*>;
-  const Fields fields{{"recsSize", &bucket.recsSize},
-                      {"recSize", &bucket.recSize},
-                      {"freeHead", &bucket.freeHead},
-                      {"freeRecs", &bucket.freeRecs}};
+  // A field is at its distance from offset 0, as a record is.
+  const std::map<std::string, int> fields{
+      {"recsSize", -6}, {"recSize", -4}, {"freeHead", -2}, {"freeRecs", 0}};
   // Pairs of a field or an offset, and its new value; a record has its type 2 bytes on.
   const auto damage = [&](const std::string& text) {
-    std::copy(whole.begin(), whole.end(), bytes.begin());
+    std::ranges::copy(whole, bytes.begin());
     std::istringstream words(text);
     std::uint16_t value;
-    for (std::string place; words >> place >> value;)
-      if (fields.contains(place))
-        *fields.at(place) = value;
-      else
-        bucket.RecAt(static_cast<unsigned>(std::stoul(place)))->SetOffset(value);
+    for (std::string place; words >> place >> value;) {
+      const int offset = fields.contains(place) ? fields.at(place) : std::stoi(place);
+      std::memcpy(&bytes[recsBaseOffset] + offset, &value, sizeof value);
+    }
   };
   const auto report = [&](bool showRecs, bool showFreeList) {
     return Report([&] { bucket.Dbg(std::cout, 1000, 1, showRecs, showFreeList); });
@@ -191,7 +188,7 @@ TEST_F(Reports, DamagedBucket) {
   EXPECT_THAT(report(true, false), Not(HasSubstr("FREE LIST")));
   EXPECT_THAT(report(false, true), Not(HasSubstr("ALL RECORDS")));
 
-  damage("recSize 15 18 50"); // each warning stands below the row that sets it off
+  damage("recSize 15 18 50"); // each warning is below the row that sets it off
   ExpectGolden("warnings", report(true, true));
 
   // What each damage changes, and the warnings, on standard output wherever the report goes.

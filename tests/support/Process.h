@@ -6,17 +6,13 @@
 #include "MemPool"
 
 #include <algorithm>
-#include <cstdint>
 #include <cstring>
 #include <functional>
 #include <iostream>
 #include <locale>
 #include <map>
 #include <memory>
-#include <new>
 #include <sstream>
-#include <string>
-#include <utility>
 #include <vector>
 
 /// Sets what the text names.
@@ -54,12 +50,6 @@ inline std::locale Grouping(const char* sizes = "\1") {
   };
   return {std::locale::classic(), new Format(sizes)};
 }
-
-/// While it lives, the global locale groups digits.
-struct GroupingLocale {
-  ~GroupingLocale() { std::locale::global(before); }
-  const std::locale before = std::locale::global(Grouping());
-};
 
 /// Replaces a stream's buffer while it lives, and ends by restoring the stream's whole state. The
 /// stream throws what it can.
