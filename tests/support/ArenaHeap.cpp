@@ -56,13 +56,18 @@ std::uint8_t* Arena() {
 // So that a block's last granule of 16 and the guard after it are always ours.
 std::size_t RoomOf(std::size_t size) { return (std::max<std::size_t>(size, 1) + 15) / 16 * 16; }
 
-// A block between its guards.
-Bytes Framed(const Bytes& block) {
+// Writes a block with the guards around it if it is new; whether all of that is in place.
+bool IsFramed(std::uint8_t* p, const Bytes& block, bool isNew) {
   Bytes frame(guard + RoomOf(block.size()) + guard - 4, 0xFD);
   for (unsigned i = 0; i < 4; ++i)
     frame[guard - 4 + i] = static_cast<std::uint8_t>(block.size() >> 8 * i);
   std::ranges::copy(block, frame.begin() + guard);
-  return frame;
+  ArenaHeap::Unpoison(p - guard, frame.size());
+  if (isNew) std::ranges::copy(frame, p - guard);
+  const bool isFramed = std::equal(frame.begin(), frame.end(), p - guard);
+  Poison(p - guard, frame.size());
+  ArenaHeap::Unpoison(p, block.size());
+  return isFramed;
 }
 
 void* Allocate(std::size_t size, ArenaHeap::Form form) {
@@ -108,11 +113,7 @@ void* ArenaHeap::Allocate(std::size_t size, Form form) {
   if (sameRoom.empty()) sameRoom.push_back(std::exchange(end, end + RoomOf(size) + guard));
   std::uint8_t* const p = sameRoom.back();
   sameRoom.pop_back();
-  const Bytes frame = Framed(Bytes(size, delivered));
-  Unpoison(p - guard, frame.size());
-  std::ranges::copy(frame, p - guard);
-  Poison(p - guard, frame.size());
-  Unpoison(p, size);
+  IsFramed(p, Bytes(size, delivered), true);
   live[p] = {form, size};
   events.push_back({'+', form, size, p, {}});
   return p;
@@ -143,11 +144,7 @@ const std::vector<std::string>& ArenaHeap::Finish() {
 }
 
 void ArenaHeap::CheckGuards(std::uint8_t* p, std::size_t size) {
-  const Bytes frame = Framed({p, p + size});
-  Unpoison(p - guard, frame.size());
-  if (!std::equal(frame.begin(), frame.end(), p - guard)) Fault("written beyond its bounds", size);
-  Poison(p - guard, frame.size());
-  Unpoison(p, size);
+  if (!IsFramed(p, {p, p + size}, false)) Fault("written beyond its bounds", size);
 }
 
 // The library uses no other form; of those, the standard library uses one.

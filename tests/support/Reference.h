@@ -55,12 +55,13 @@ public:
 
     /// What a pool makes of them.
     Settings Normalised() const {
-      Settings s = *this;
-      s.bucketSize = std::min(bucketSize, 65535u);
-      s.dataAlignment = std::max(dataAlignment % 65536, 1u);
-      s.maxRecSize = maxRecSize / s.dataAlignment * s.dataAlignment;
-      s.minRecSize = s.Rounded(minRecSize);
-      return s;
+      const std::uint32_t unit = std::max(dataAlignment % 65536, 1u);
+      return {std::min(bucketSize, 65535u),
+              unit,
+              maxRecSize / unit * unit,
+              std::max((minRecSize + unit - 1) / unit, 1u) * unit,
+              keepEmptyBuckets,
+              on};
     }
     bool IsPossible() const {
       const Settings s = Normalised();
