@@ -74,7 +74,7 @@ TEST_F(Pools, BucketAtNull) {
 }
 #endif
 
-// What a pool's own call never asks: a lookup by the Group itself, and another Group's bucket.
+// What a pool's own call never does: a lookup by the Group itself, and another Group's bucket.
 TEST_F(Pools, GroupFree) {
   Mgr& pool = Make("a");
   std::uint8_t* const p = Alloc(pool, 4);
@@ -108,8 +108,8 @@ TEST_F(Pools, ClassBeyondTheTable) {
   Bucket::Destroy(b);
 }
 
-// A heap's size field before a block can read as a used record's header, and its bucket's as that
-// of no memory at all: a disabled pool looks at none. The first block is at the arena's start.
+// A heap's size field before a block can read as a used record's header, and lead to a bucket in
+// no memory at all: a disabled pool reads no header. The first block is at the arena's start.
 TEST_F(Pools, DisabledBlocksOfAnySize) {
   Mgr pool;
   for (const bool arena : {true, false})
@@ -123,7 +123,7 @@ TEST_F(Pools, DisabledBlocksOfAnySize) {
     }
 }
 
-TEST_F(Pools, IsValidSeesEachDamage) {
+TEST_F(Pools, IsValidFindsEachDamage) {
   Mgr& mgr = Make("a", "bucket=26 max=16 keep=1");
   const std::vector<std::uint8_t*> p = Alloc(mgr, 9, 4);
   std::memset(p[4], 0, 4); // reads as the header of a free record, and is none
@@ -169,8 +169,8 @@ TEST_F(Pools, IsValidSeesEachDamage) {
   EXPECT_TRUE(IsValid(pool));
 }
 
-// A handle that ended does nothing at a second end, and its pool leads nowhere.
-TEST_F(Pools, EndedTwice) {
+// A second destruction of a handle does nothing, and its pool's pointers are null.
+TEST_F(Pools, DestroyedTwice) {
   alignas(Mgr) unsigned char place[sizeof(Mgr)];
   Make("a"); // so that the registry has something to compare
   const ArenaHeap::Use use;

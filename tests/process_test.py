@@ -1,7 +1,7 @@
 #!/usr/bin/env python3
 """Child programs under environment keys: all that each writes and how it ends. Arguments: the folder
 of the programs, and the command that starts one where they don't start by themselves; or --observers
-for the memory checkers."""
+for the memory-checking tools."""
 import collections
 import itertools
 import os
@@ -13,8 +13,8 @@ import sys
 
 # A call on each line, "[PROGRAM] [KEY=VALUE]... : OPERATION; ... | OPERATION AT EXIT; ...", and
 # after "->" what it writes, line by line, with a "!" before a line on the error stream, and its
-# status, if it isn't 0. A line that begins with a blank goes on with the one above. The first word
-# may be some that take turns: ON=* stands for ON=0|ON=1. The statements of messages are numbered
+# status, if it isn't 0. A line that begins with a space continues the one above. The first word
+# may have alternatives: ON=* means ON=0|ON=1. The statements of messages are numbered
 # within a paragraph.
 CALLS = """
 # What passes each key's test, and the banner.
@@ -66,7 +66,7 @@ pool_host ON=1 TRACE=1 ZOR_STATIC_POOLS=1 : open client; pool a; close; open cli
     3 of 6: __VOK_MEMPOOL_00001 b client; zvpt:d:@5; zvpt:d:@4
 """
 
-# The registry's end comes first, and a pool still serves. A failed load at run time throws its text,
+# The registry is destroyed first, and pools still serve. A failed load at run time throws its text,
 # and the library stays, with the settings as read. Each key is looked up once, in its order.
 ON_LINUX = """
 pool_host ON=1 TRACE=1 ZOR_STATIC_POOLS=1 : open client; pool a | names; alloc 10; free 0; drop;
@@ -88,7 +88,7 @@ pool_host ON=1 TRACE=1 ZOR_STATIC_POOLS=1 : open client; pool a | names; alloc 1
 pool_host MIN_RECORD_SIZE=1000 : open library -> !EXCEPTION 1: (1000>=1000); aborted
 """
 
-# What each memory checker must find, after each "~" a pattern. A record of 9 bytes has 12, and an empty
+# What each memory-checking tool must find, after each "~" a pattern. A record of 9 bytes has 12, and an empty
 # bucket that is kept is no leak. The records are what heaptrack counts, and not their blocks.
 FAULTS = r"""
 memcheck ON=1 : pool a; alloc 9; write 9 -> status 9 ~ Invalid write of size 1
@@ -119,7 +119,7 @@ heaptrack ON=1 KEEP_EMPTY_BUCKETS=1 : pool a; alloc 5000; reset; alloc 11; alloc
     free 2; free 3; alloc 10; forget
     -> ~ (?m)^21B leaked over ~ (?s)^(?!.*Bucket::Create)
 
-# What neither of two may find. A second Free is refused.
+# What neither of two may find. A second Free returns false.
 memcheck|asan ON=1 : pool a; alloc 10; alloc 10; free 1; free 1; size 1; contains 1; drop
     -> freed; refused; 0; 0
 memcheck|asan ON=1 : pool a; alloc 12; alloc 12; free 0; write 0; alloc 12; write 16; drop -> freed
@@ -221,7 +221,7 @@ def masked(text, statements):
     def address(match):
         letter, pool, block = match.groups()
         shown = f"zvpt:{letter}:@{addresses[pool]}" + (f":@{addresses[block]}" if block else "")
-        if letter in "df":  # what ends gives its number up
+        if letter in "df":  # a freed address may be used again
             del addresses[block or pool]
         return shown
 

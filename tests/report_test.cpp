@@ -207,8 +207,8 @@ TEST_F(Reports, DamagedBucket) {
   }
   ExpectGolden("damages", changes);
 
-  // All walks end and stay in the block, which the address sanitizer watches, and write nothing
-  // into it. Nothing in a bucket tells how large its block is, so its area only shrinks.
+  // All walks end and stay in the block, which the address sanitizer checks, and write nothing
+  // into it. Nothing in a bucket documents the size of its block, so its area only shrinks.
   std::istringstream places("recsSize recSize freeHead freeRecs 2 4 18 20 34 36 50 52 66 68 82 84 "
                             "98 100 114 116 130 132 146 148");
   for (std::string place; places >> place;)

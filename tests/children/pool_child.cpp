@@ -37,7 +37,7 @@ extern "C" bool Act(const std::string& name, State& state);
 
 namespace {
 
-// Never destroyed, so that a leak checker finds in it what exists at the end.
+// Never destroyed, so that a leak check finds in it what exists at the end.
 auto& ownState = *new State;
 void* handle;
 decltype(&Act) actOfClient;
@@ -67,7 +67,7 @@ void Build(State& s) {
     s.Pool().Alloc(992);
 }
 
-// The compiler must not drop a write that nobody reads.
+// The compiler must not drop a write that nothing reads.
 void Write(State& s) { static_cast<volatile char*>(s.blocks.back())[std::stol(s.operand)] = 2; }
 
 // Where the pool of that name is in the list of this program; null is a name, too.
@@ -154,7 +154,7 @@ bool Act(const std::string& name, State& state) {
 }
 
 #if defined(__GLIBC__) && !defined(VOK_MEMPOOL_HOST)
-// Stands in for the platform's function, to show what is looked up and in which order.
+// Replaces the platform's function, to show what is looked up and in which order.
 char* secure_getenv(const char* key) noexcept {
   if (std::getenv("ZOR_SHOW_KEYS") != nullptr) std::printf("%s\n", key);
   return std::getenv(key);

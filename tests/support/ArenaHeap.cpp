@@ -33,7 +33,7 @@ constexpr std::size_t guard = 16; // before each block and after the last
 
 ArenaHeap* heap = nullptr;
 
-// As any heap does, the arena tells the memory-checking tools what may be touched.
+// As any heap does, the arena reports to the memory-checking tools what may be accessed.
 void Poison(const void* from, std::size_t size) {
   ASAN_POISON_MEMORY_REGION(from, size);
   static_cast<void>(VALGRIND_MAKE_MEM_NOACCESS(from, size));

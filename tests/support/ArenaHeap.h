@@ -1,5 +1,5 @@
-// The test program's general heap, replaced: while a test asks for it, operator new takes its
-// blocks from an arena at a fixed place. Equal calls give equal addresses, of eight hexadecimal
+// The test program's general heap, replaced: while a test asks for it, operator new allocates
+// from an arena at a fixed place. Equal calls give equal addresses, of eight hexadecimal
 // digits at 4-byte pointers and twelve at 8-byte pointers, on every platform and in every run.
 #ifndef VOK_MEMPOOL_TESTS_ARENAHEAP_H
 #define VOK_MEMPOOL_TESTS_ARENAHEAP_H
@@ -70,7 +70,7 @@ private:
 
   std::uint8_t* end; // of what was ever allocated, after the last guard
   std::map<std::uint8_t*, std::pair<Form, std::size_t>> live;
-  std::map<std::size_t, std::vector<std::uint8_t*>> spare; // by the room that they take
+  std::map<std::size_t, std::vector<std::uint8_t*>> spare; // by their room
   unsigned failIn = 0;
 };
 

@@ -88,26 +88,26 @@ public:
 
   Reference(Log& log_, const Settings& given, VOK::MemPool::Mgr* mgr_)
       : settings(given.Normalised()), log(log_), mgr(mgr_) {
-    pool = Take(Form::Plain, 0);
+    pool = AllocBlock(Form::Plain, 0);
     blocks[pool + sizeof(std::string)].resize(3 * P + 26);
     Trace("c:");
     try {
-      table = Take(Form::Array, settings.NumGroups() * P, 0);
-      node = Take(Form::Plain, 0);
+      table = AllocBlock(Form::Array, settings.NumGroups() * P, 0);
+      node = AllocBlock(Form::Plain, 0);
     } catch (const std::bad_alloc&) {
       if (table != nullptr) End();
-      Release(Form::Plain, pool);
+      FreeBlock(Form::Plain, pool);
       throw;
     }
   }
   void Destroy() {
-    Release(Form::Plain, node);
+    FreeBlock(Form::Plain, node);
     End();
-    Release(Form::Plain, pool);
+    FreeBlock(Form::Plain, pool);
   }
   std::uint8_t* Alloc(std::uint32_t size) {
     const std::uint32_t dataSize = settings.Rounded(size);
-    std::uint8_t* const p = !settings.on                         ? Take(Form::Array, size)
+    std::uint8_t* const p = !settings.on                         ? AllocBlock(Form::Array, size)
                             : dataSize + 4 > settings.maxRecSize ? AllocExt(size)
                                                                  : AllocRec(dataSize);
     Trace("a:", ":" + Text(p) + ":" + std::to_string(size));
@@ -116,7 +116,7 @@ public:
   bool Free(std::uint8_t* p) {
     if (p == nullptr) return false;
     Trace("f:", ":" + Text(p) + ":");
-    if (!settings.on) return Release(Form::Array, p), true;
+    if (!settings.on) return FreeBlock(Form::Array, p), true;
     if (RecordSize(p) > 0) return FreeRec(Around(p), p), true;
     if (ExtSize(p) == 0) return false;
     Scrub(p - extHeader, extHeader);
@@ -124,18 +124,18 @@ public:
     return true;
   }
   void Clear() {
-    ReleaseExts();
+    FreeExts();
     for (const auto& [index, group] : std::exchange(groups, {})) {
       for (std::uint8_t* bucket : group.all)
         Scrub(bucket, 5 * P + 4);
-      Release(Form::Plain, group.at);
+      FreeBlock(Form::Plain, group.at);
     }
     buckets.clear();
     Refresh();
   }
   bool Reset() {
     if (!settings.on) return false;
-    ReleaseExts();
+    FreeExts();
     for (auto& [index, group] : groups) {
       group.withFree = group.all;
       for (std::uint8_t* bucket : group.all)
@@ -205,12 +205,12 @@ private:
   std::uint8_t* AllocRec(std::uint32_t dataSize) {
     const std::uint32_t index = settings.Index(dataSize);
     if (!groups.contains(index)) {
-      std::uint8_t* const at = Take(Form::Plain, 4 * P + 12);
+      std::uint8_t* const at = AllocBlock(Form::Plain, 4 * P + 12);
       groups[index] = {at, settings.Capacity(dataSize) + 4, {}, {}};
     }
     Group& group = groups[index];
     if (group.withFree.empty()) {
-      std::uint8_t* const at = Take(Form::Array, base + 2 + Total(group) * group.recSize);
+      std::uint8_t* const at = AllocBlock(Form::Array, base + 2 + Total(group) * group.recSize);
       buckets[at] = {&group, NewList(group), nullptr};
       group.all.push_front(at);
       group.withFree.push_front(at);
@@ -238,7 +238,7 @@ private:
     Scrub(at, 5 * P + 4);
   }
   std::uint8_t* AllocExt(std::uint32_t size) {
-    std::uint8_t* const at = Take(Form::Array, extHeader + size);
+    std::uint8_t* const at = AllocBlock(Form::Array, extHeader + size);
     Put(at, 2 * P, size, Byte(0xAA), Byte(0xBB), Byte(2), Byte(0xCC));
     exts.push_front(at);
     return at + extHeader;
@@ -246,7 +246,7 @@ private:
   void End() {
     Trace("d:");
     Clear();
-    Release(Form::Array, table);
+    FreeBlock(Form::Array, table);
   }
   std::uint32_t Total(const Group& of) const { return (settings.bucketSize - 2) / of.recSize; }
 
@@ -287,7 +287,7 @@ private:
     ((std::memcpy(&blocks[block][at], &fields, sizeof fields), at += sizeof fields), ...);
   }
 
-  std::uint8_t* Take(Form form, std::size_t size, std::uint8_t fill = ArenaHeap::delivered) {
+  std::uint8_t* AllocBlock(Form form, std::size_t size, std::uint8_t fill = ArenaHeap::delivered) {
     const ArenaHeap::Event& event = log.Next("+!");
     Demand(event.form == form && (event.size == size || form == Form::Plain), "another block");
     if (event.kind == '!') throw std::bad_alloc();
@@ -295,21 +295,21 @@ private:
     blocks[at].assign(size, fill);
     return at;
   }
-  void Release(Form form, std::uint8_t* at) {
+  void FreeBlock(Form form, std::uint8_t* at) {
     const ArenaHeap::Event& event = log.Next("-");
-    Demand(event.form == form && event.block == at, "another block is released");
-    Demand(form == Form::Plain || event.bytes == blocks[at], "other bytes are released");
+    Demand(event.form == form && event.block == at, "another block is freed");
+    Demand(form == Form::Plain || event.bytes == blocks[at], "other bytes are freed");
     blocks.erase(at);
   }
-  void ReleaseExts() {
+  void FreeExts() {
     Refresh();
     for (std::uint8_t* ext : std::exchange(exts, {}))
-      Release(Form::Array, ext);
+      FreeBlock(Form::Array, ext);
   }
-  // Releases a block whose header is zeroed.
+  // Frees a block whose header is zeroed.
   void Scrub(std::uint8_t* at, std::size_t header) {
     std::fill_n(blocks[at].begin(), header, std::uint8_t{0});
-    Release(Form::Array, at);
+    FreeBlock(Form::Array, at);
   }
   void Trace(const std::string& letter, const std::string& operands = "") {
     if (VOK::MemPool::ZOR_VOK_MEMPOOL_TRACE())
