@@ -6,30 +6,25 @@
 
 #include <gmock/gmock.h>
 
-#include <algorithm>
-#include <cstdint>
-#include <functional>
 #include <list>
 #include <memory_resource>
 #include <stdexcept>
-#include <vector>
 
 namespace {
 
 using namespace VOK::MemPool;
 
 /// Expects that the report counts nothing as in use, large blocks included. Of a pool with pooling
-/// off it never does; there the leak check of the address sanitizer watches.
+/// off it never does; there the leak check of the address sanitizer finds what is left.
 void ExpectEmpty(const Mgr& pool) {
-  testing::internal::CaptureStdout();
+  Output output;
   pool.Dbg();
-  EXPECT_THAT(testing::internal::GetCapturedStdout(),
+  EXPECT_THAT(output.Text(),
               testing::HasSubstr("Used Recs   :        0\n   Ext Recs    :        0\n"));
 }
 
 /// Each pool must be empty in the end.
-template <class Use>
-void ForEachSetting(Use use) {
+void ForEachSetting(const std::function<void(Mgr&)>& use) {
   const KeepSettings settings{};
   for (const std::string alignment : {"1", "2", "4", "6", "8", "12", "16"})
     for (const char* const more : {" on=0", " on=1 max=64", " max=1000", " max=4006"}) {
@@ -82,7 +77,7 @@ TEST(Resource, CostsWhatIsDocumented) {
   ExpectEmpty(pool);
 }
 
-/// Throws where too many live; checks its place, and that nobody writes into it.
+/// Throws where too many live; checks its place, and that nothing else writes into it.
 template <std::size_t N>
 struct alignas(N) Part {
   static inline int living, limit;
@@ -124,26 +119,11 @@ struct Nut final : Pooled<Nut<N, on>, Parts<on, 2>> {
   Part<N> part;
 };
 
-/// Runs each row anew with an exception at each part that it makes, then to its end.
-template <std::size_t N>
-void Run(const std::initializer_list<std::function<void()>>& rows) {
-  for (const auto& row : rows) {
-    Part<N>::limit = 0;
-    EXPECT_THROW(row(), std::runtime_error);
-    while (++Part<N>::limit < 50)
-      try {
-        row();
-      } catch (const std::runtime_error&) {
-      }
-    EXPECT_EQ(Part<N>::living, 0);
-  }
-}
-
 template <std::size_t N, bool on>
 void MakeAll(Mgr& pool) {
   using P = Part<N>;
   using B = Bolt<N, on>;
-  Run<N>({
+  const std::function<void()> rows[] = {
       [&] { std::vector<P, Allocator<P>>(3, pool).resize(7); },
       [&] { std::list<P, Allocator<P>>(7, Allocator<P>(pool)); },
       [&] { MakeUnique<const P>(pool); },
@@ -173,7 +153,18 @@ void MakeAll(Mgr& pool) {
         alignas(B) char place[sizeof(B)];
         (new (place) B)->~B();
       },
-  });
+  };
+  // Each row again with an exception at each part that it makes, then to its end.
+  for (const auto& row : rows) {
+    P::limit = 0;
+    EXPECT_THROW(row(), std::runtime_error);
+    while (++P::limit < 50)
+      try {
+        row();
+      } catch (const std::runtime_error&) {
+      }
+    EXPECT_EQ(P::living, 0);
+  }
   const auto numbers = MakeUnique<std::int16_t[][N]>(pool, N);
   EXPECT_EQ(numbers[N - 1][N - 1], 0);
 
@@ -222,11 +213,9 @@ constexpr bool isAsStandard =
 TEST(Adaptors, CompareAndConvertAsTheStandardsDo) {
   Mgr a;
   Mgr b;
-  EXPECT_TRUE(Allocator<int>(a) == Allocator<char>(a));
-  EXPECT_TRUE(Allocator<int>(a) != Allocator<int>(b));
-  EXPECT_TRUE(Resource(a).is_equal(Resource(a)));
-  EXPECT_FALSE(Resource(a).is_equal(Resource(b)));
-  EXPECT_FALSE(Resource(a).is_equal(*std::pmr::new_delete_resource()));
+  EXPECT_TRUE(Allocator<int>(a) == Allocator<char>(a) && Allocator<int>(a) != Allocator<int>(b));
+  EXPECT_TRUE(Resource(a).is_equal(Resource(a)) && !Resource(a).is_equal(Resource(b)) &&
+              !Resource(a).is_equal(*std::pmr::new_delete_resource()));
 
   using A = Allocator<int>;
   static_assert(!A::is_always_equal::value && !A::propagate_on_container_copy_assignment::value);

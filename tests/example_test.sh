@@ -1,6 +1,6 @@
 #!/usr/bin/env bash
 # Runs an example by the command given as arguments, and compares what it prints with its golden
-# text, or writes that anew if VOK_MEMPOOL_APPROVE is set. An address becomes a number, the same at
+# text, or writes that again if VOK_MEMPOOL_APPROVE is set. An address becomes a number, the same at
 # each place, and the sizes that go with the width of a pointer become an N.
 set -uo pipefail
 golden=$(dirname "$0")/golden/examples/$(basename "${@: -1}" .exe).txt

@@ -1,7 +1,7 @@
 #!/usr/bin/env python3
 """Child programs under environment keys: all that each writes and how it ends. Arguments: the folder
 of the programs, and the command that starts one where they don't start by themselves; or --observers
-for the memory checkers."""
+for the memory-checking tools."""
 import collections
 import itertools
 import os
@@ -13,8 +13,8 @@ import sys
 
 # A call on each line, "[PROGRAM] [KEY=VALUE]... : OPERATION; ... | OPERATION AT EXIT; ...", and
 # after "->" what it writes, line by line, with a "!" before a line on the error stream, and its
-# status, if it isn't 0. A line that begins with a blank goes on with the one above. The first word
-# may be some that take turns: ON=* stands for ON=0|ON=1. The statements of messages are numbered
+# status, if it isn't 0. A line that begins with a space continues the one above. The first word
+# may have alternatives: ON=* means ON=0|ON=1. The statements of messages are numbered
 # within a paragraph.
 CALLS = """
 # What passes each key's test, and the banner.
@@ -34,9 +34,10 @@ INFO=-1 MIN_RECORD_SIZE=-1 : say main -> !EXCEPTION 12: (4294967295>=1000); abor
 
 # The ERROR lines of a handle, then those of a pool.
 ON=* TRACE=1 : pool a; set max=5000; pool a | names
-    -> zvpt:c:@1; ERROR 1: duplicate 'a'; 1 pools: a; status 1
+    -> zvpt:c:@1; ERROR 1: duplicate 'a'; 1 of 2: a; status 1
 ON=* : pool __VOK_MEMPOOL_00001; nameless -> ERROR 1: duplicate '__VOK_MEMPOOL_00001'; status 1
 ON=* : grouping; pool a; alloc 4294967295 -> ERROR 2: limit 4294967295; status 1
+ON=* : pool a; alloc 17179869200 -> ERROR 2: limit 17179869200; status 1
 
 ON=* TRACE=1 : set max=4294967295; pool a
     -> zvpt:c:@1; ERROR 1: maximum (4294967292>4006) [4010]; status 1
@@ -46,6 +47,11 @@ ON=* BUCKET_SIZE=1003 : set min=2000; pool a -> ERROR 1: maximum (1000>999) [100
 ON=* : set min=1001; pool a -> ERROR 2: minimum (1004>1000); status 1
 ON=* : set min=4294967295; pool a -> ERROR 2: minimum (4294967296>1000); status 1
 
+# Pools by name, none of which is one, too.
+ON=* : names; find a; find; pool b; pool D; pool; pool ab; pool a; names; find a; find A; find d;
+    find; drop; find a; pool a; find a
+    -> 0 of 1:; 0; 0; 5 of 10:  D a ab b; 4; 5; 5; 2; 4; 4
+
 # The last values that fit.
 ON=* : pool a; drop; pool a; alloc 1; free 0; alloc 1073741823; drop -> freed
 ON=* BUCKET_SIZE=70000 : set max=65531; pool a; alloc 65524; free 0 -> freed
@@ -53,21 +59,21 @@ ON=* BUCKET_SIZE=70000 : set max=65531; pool a; alloc 65524; free 0 -> freed
 # An ERROR line is whole before the exit, which runs what is queued for it.
 TRACE=1 ZOR_STATIC_POOLS=1 : pool a; set max=3; pool b | names
     -> zvpt:c:@1; zvpt:c:@2; zvpt:c:@3; zvpt:c:@4; ERROR 1: minimum (8>0);
-    3 pools: __VOK_MEMPOOL_00001 a client; zvpt:d:@2; zvpt:d:@1; status 1
+    3 of 6: __VOK_MEMPOOL_00001 a client; zvpt:d:@2; zvpt:d:@1; status 1
 ON=* TRACE=1 : pool a; alloc 1073741824 | cut -> zvpt:c:@1; ERROR 2: limit 1073741824; status 7
 
 # A library's static pools, and the pools that its unloading leaves.
 pool_host ON=1 TRACE=1 ZOR_STATIC_POOLS=1 : open client; pool a; close; open client; pool b; names
     -> zvpt:c:@1; zvpt:c:@2; zvpt:c:@3; zvpt:d:@2; zvpt:d:@1; zvpt:c:@4; zvpt:c:@5; zvpt:c:@6;
-    3 pools: __VOK_MEMPOOL_00001 b client; zvpt:d:@5; zvpt:d:@4
+    3 of 6: __VOK_MEMPOOL_00001 b client; zvpt:d:@5; zvpt:d:@4
 """
 
-# The registry's end comes first, and a pool still serves. A failed load at run time throws its text,
+# The registry is destroyed first, and pools still serve. A failed load at run time throws its text,
 # and the library stays, with the settings as read. Each key is looked up once, in its order.
 ON_LINUX = """
-pool_host ON=1 TRACE=1 ZOR_STATIC_POOLS=1 : open client; pool a | names; alloc 10; free 0; drop
-    -> zvpt:c:@1; zvpt:c:@2; zvpt:c:@3; zvpt:d:@2; zvpt:d:@1; 0 pools:; zvpt:a:@3:@4:10;
-    zvpt:f:@3:@4:; freed; zvpt:d:@3
+pool_host ON=1 TRACE=1 ZOR_STATIC_POOLS=1 : open client; pool a | names; alloc 10; free 0; drop;
+    pool a; names -> zvpt:c:@1; zvpt:c:@2; zvpt:c:@3; zvpt:d:@2; zvpt:d:@1; 0 of 1:; zvpt:a:@3:@4:10;
+    zvpt:f:@3:@4:; freed; zvpt:d:@3; zvpt:c:@5; 1 of 2: a
 pool_host MIN_RECORD_SIZE=1000 ON=1 TRACE=1 : grouping; open library; open client; nameless;
     alloc 10 -> EXCEPTION 1: (1000>=1000); zvpt:c:@1; zvpt:a:@1:@2:10; !EXCEPTION 1: (1000>=1000)
 ZOR_SHOW_KEYS=1 ON=0 : -> ON; ZOR_MEMPOOL_ON; TRACE; BUCKET_SIZE; MAX_RECORD_SIZE;
@@ -79,12 +85,12 @@ ZOR_SHOW_KEYS=1 ON=1 : -> ON; TRACE; BUCKET_SIZE; MAX_RECORD_SIZE; MIN_RECORD_SI
 # A program's handlers run ahead of any library's, and a load throws nothing to its caller.
 ON_WINDOWS = """
 pool_host ON=1 TRACE=1 ZOR_STATIC_POOLS=1 : open client; pool a | names; alloc 10; free 0; drop
-    -> zvpt:c:@1; zvpt:c:@2; zvpt:c:@3; 3 pools: __VOK_MEMPOOL_00001 a client; zvpt:a:@3:@4:10;
+    -> zvpt:c:@1; zvpt:c:@2; zvpt:c:@3; 3 of 6: __VOK_MEMPOOL_00001 a client; zvpt:a:@3:@4:10;
     zvpt:f:@3:@4:; freed; zvpt:d:@3; zvpt:d:@2; zvpt:d:@1
 pool_host MIN_RECORD_SIZE=1000 : open library -> !EXCEPTION 1: (1000>=1000); aborted
 """
 
-# What each memory checker must find, after each "~" a pattern. A record of 9 bytes has 12, and an empty
+# What each memory-checking tool must find, after each "~" a pattern. A record of 9 bytes has 12, and an empty
 # bucket that is kept is no leak. The records are what heaptrack counts, and not their blocks.
 FAULTS = r"""
 memcheck ON=1 : pool a; alloc 9; write 9 -> status 9 ~ Invalid write of size 1
@@ -115,7 +121,7 @@ heaptrack ON=1 KEEP_EMPTY_BUCKETS=1 : pool a; alloc 5000; reset; alloc 11; alloc
     free 2; free 3; alloc 10; forget
     -> ~ (?m)^21B leaked over ~ (?s)^(?!.*Bucket::Create)
 
-# What neither of two may find. A second Free is refused.
+# What neither of two may find. A second Free returns false.
 memcheck|asan ON=1 : pool a; alloc 10; alloc 10; free 1; free 1; size 1; contains 1; drop
     -> freed; refused; 0; 0
 memcheck|asan ON=1 : pool a; alloc 12; alloc 12; free 0; write 0; alloc 12; write 16; drop -> freed
@@ -217,7 +223,7 @@ def masked(text, statements):
     def address(match):
         letter, pool, block = match.groups()
         shown = f"zvpt:{letter}:@{addresses[pool]}" + (f":@{addresses[block]}" if block else "")
-        if letter in "df":  # what ends gives its number up
+        if letter in "df":  # a freed address may be used again
             del addresses[block or pool]
         return shown
 

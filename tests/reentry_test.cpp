@@ -1,18 +1,7 @@
 // A new-handler that uses the pool whose Alloc is out of memory.
-#include "support/ArenaHeap.h"
-#include "support/Process.h"
+#include "support/Pools.h"
 
-#include "MemPool"
-#include "engine/BucketMgr.h"
 #include "engine/Invariants.h"
-
-#include <gtest/gtest.h>
-
-#include <cstring>
-#include <new>
-#include <vector>
-
-using namespace VOK::MemPool;
 
 namespace {
 
@@ -22,57 +11,38 @@ enum Step { reset = -3, clear = -2, freeAll = -1 };
 const std::vector<int> plans[] = {{clear},           {freeAll},     {reset},
                                   {4, 8, 100, 4, 4}, {clear, 8, 4}, {reset, 8, 4}};
 
-struct Reentered {
-  Mgr mgr;
-  std::vector<void*> held;
+std::function<void()> handler;
 
-  void Do(int step) {
-    void* const p =
-        step >= 0 ? std::memset(mgr.Alloc(unsigned(step)), 0xA5, unsigned(step)) : nullptr;
-    const ArenaHeap::Use real(false);
-    if (p != nullptr) return held.push_back(p);
-    if (step == clear) mgr.Clear();
-    EXPECT_TRUE(step != reset || mgr.Reset());
-    for (void* const h : held)
-      EXPECT_TRUE(step != freeAll || (mgr.Contains(h) && mgr.GetSize(h) >= 4 &&
-                                      *static_cast<std::uint8_t*>(h) == 0xA5 && mgr.Free(h)));
-    held.clear();
-  }
-};
-
-Reentered* pool;
-const std::vector<int>* plan;
-int numRuns = 0;
-
-TEST(NewHandler, MayUseThePoolThatIsOutOfMemory) {
-  const KeepSettings settings{};
-  Set("on=1 bucket=26 max=16"); // two records of 4 bytes, one of 8
-  for (const std::vector<int>& steps : plans)
-    for (const int numBefore : {0, 2, 4})
+TEST_F(Pools, NewHandlerMayUseThePoolThatIsOutOfMemory) {
+  int numRuns = 0;
+  for (const std::vector<int>& plan : plans)
+    for (const unsigned numBefore : {0u, 2u, 4u})
       for (const int size : {4, 8, 100})
         for (const unsigned call : {1u, 2u, 3u}) {
           SCOPED_TRACE(testing::Message()
                        << numBefore << " before, size " << size << ", failing " << call);
-          ArenaHeap heap;
-          const ArenaHeap::Use use;
-          Reentered reentered;
-          pool = &reentered;
-          plan = &steps;
-          for (int i = 0; i < numBefore; ++i)
-            pool->Do(4);
+          pools.clear();
+          Mgr& pool = Make("a", "bucket=26 max=16"); // two records of 4 bytes, one of 8
+          std::vector<std::uint8_t*> held = Alloc(pool, numBefore, 4);
+          const auto act = [&](int step) {
+            const ArenaHeap::Use real(false);
+            if (step >= 0) return held.push_back(Alloc(pool, unsigned(step)));
+            if (step == clear) pool.Clear();
+            EXPECT_TRUE(step != reset || pool.Reset());
+            for (std::uint8_t* const p : std::exchange(held, {}))
+              EXPECT_TRUE(step != freeAll ||
+                          (pool.Contains(p) && pool.GetSize(p) >= 4 && *p == 0x5A && pool.Free(p)));
+          };
+          handler = [&] { ++numRuns, std::ranges::for_each(plan, act); };
+          std::set_new_handler([] { handler(); });
           heap.FailAt(call);
-          std::set_new_handler([] {
-            ++numRuns;
-            for (const int step : *plan)
-              pool->Do(step);
-          });
-          pool->Do(size);
-          std::set_new_handler(nullptr);
+          act(size);
           heap.FailAt(0);
-          EXPECT_TRUE(IsValid(*pool->mgr.GetBucketMgr()));
-          pool->Do(steps[0] == reset ? clear : freeAll);
-          EXPECT_EQ(pool->mgr.GetBucketMgr()->GetNumBuckets(), 0u);
-          EXPECT_EQ(heap.faults, std::vector<std::string>());
+          std::set_new_handler(nullptr);
+          EXPECT_TRUE(IsValid(*pool.GetBucketMgr()));
+          act(plan[0] == reset ? clear : freeAll);
+          EXPECT_EQ(pool.GetBucketMgr()->GetNumBuckets(), 0u);
+          EXPECT_THAT(heap.faults, testing::IsEmpty());
         }
   EXPECT_GE(numRuns, 36);
 }

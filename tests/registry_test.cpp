@@ -1,77 +1,22 @@
-#include "support/ArenaHeap.h"
-#include "support/Process.h"
+#include "support/Pools.h"
 
-#include "MemPool"
-#include "engine/BucketMgr.h"
 #include "services/MgrRegistry.h"
-
-#include <algorithm>
-#include <cstring>
-#include <gtest/gtest.h>
-#include <new>
-#include <optional>
-
-using namespace VOK::MemPool;
 
 namespace {
 
-// Before main, so that it is the first of the process.
-const std::string firstName = MgrRegistry::NextAutomaticName();
-
-unsigned long NextNumber() { return std::stoul(MgrRegistry::NextAutomaticName().substr(14)); }
-
-/// By both lists, which append to what is in them.
-std::vector<Mgr*> AllMgrs() {
-  std::vector<Mgr*> mgrs{nullptr};
-  GetMgrs(mgrs);
-  VOK::vector<Mgr*> own;
-  own.Append(nullptr);
-  GetMgrs(own);
-  EXPECT_TRUE(std::ranges::equal(own, mgrs) && mgrs[0] == nullptr);
-  EXPECT_EQ(own.capacity, std::max(1u, 2 * GetNumMgrs())); // room for that many, then doubled
-  mgrs.erase(mgrs.begin());
-  EXPECT_EQ(GetNumMgrs(), mgrs.size());
-  return mgrs;
-}
-
-TEST(Registry, PoolsByName) {
-  EXPECT_EQ(AllMgrs(), std::vector<Mgr*>());
-  EXPECT_TRUE(GetMgr("a") == nullptr && GetMgr(nullptr) == nullptr);
-  Mgr b("b");
-  std::optional<Mgr> a("a");
-  Mgr capital("D");
-  EXPECT_TRUE(GetMgr("a") == &*a && GetMgr("A") == nullptr && GetMgr("d") == nullptr);
-  EXPECT_TRUE(GetMgr("") == nullptr && GetMgr(nullptr) == nullptr);
-  Mgr empty("");
-  Mgr ab("ab");
-  EXPECT_TRUE(GetMgr("") == &empty && GetMgr(nullptr) == &empty);
-  EXPECT_EQ(AllMgrs(), (std::vector{&empty, &capital, &*a, &ab, &b}));
-  a.reset();
-  EXPECT_EQ(GetMgr("a"), nullptr);
-  Mgr again("a");
-  EXPECT_EQ(GetMgr("a"), &again);
-  EXPECT_STREQ(again.GetName(), "a");
-  EXPECT_EQ(again.GetBucketMgr()->name, "a");
-
-  MgrRegistry::End();
-  EXPECT_EQ(AllMgrs(), std::vector<Mgr*>());
-  Mgr late("a");
-  { const Mgr pool("c"); }
-  EXPECT_EQ(AllMgrs(), std::vector{&late});
-}
-
-// A number never comes again: not after its pool is gone, nor where the pool ran out of memory, at
-// whichever of its allocations, and then nothing is left of it.
-TEST(Registry, AutomaticNames) {
-  EXPECT_EQ(firstName, "__VOK_MEMPOOL_00001");
-  unsigned long number = NextNumber();
-  const auto nextName = [&number] {
-    return "__VOK_MEMPOOL_" + std::to_string(++number + 100000).substr(1);
+// A number is never used again: not after its pool is gone, nor where the pool ran out of memory,
+// at whichever of its allocations, and then nothing is left of it.
+TEST_F(Pools, AutomaticNames) {
+  const std::locale before = std::locale::global(Grouping());
+  unsigned long number = std::stoul(MgrRegistry::NextAutomaticName().substr(14));
+  const auto expectNext = [&](const std::string& name) {
+    char expected[40];
+    std::snprintf(expected, sizeof expected, "__VOK_MEMPOOL_%05lu", ++number);
+    EXPECT_EQ(name, expected);
   };
-  ArenaHeap heap;
-  unsigned numFailed = 0;
-  for (bool done = false; !done; ++numFailed) {
-    heap.FailAt(numFailed + 1);
+  unsigned k = 0;
+  for (bool done = false; !done;) {
+    heap.FailAt(++k);
     try {
       const ArenaHeap::Use use;
       const Mgr first;
@@ -79,33 +24,18 @@ TEST(Registry, AutomaticNames) {
       done = true;
       const ArenaHeap::Use real(false);
       heap.FailAt(0);
-      EXPECT_EQ(first.GetName(), nextName());
+      expectNext(first.GetName());
     } catch (const std::bad_alloc&) {
       ++number;
     }
-    EXPECT_EQ(heap.Finish(), std::vector<std::string>());
+    EXPECT_THAT(heap.Finish(), testing::IsEmpty());
     EXPECT_EQ(GetNumMgrs(), 0u);
   }
-  EXPECT_GT(numFailed, 8u);
-  EXPECT_EQ(Mgr().GetName(), nextName());
-
-  const GroupingLocale locale;
-  while (NextNumber() < 99998) {
-  }
-  EXPECT_EQ(MgrRegistry::NextAutomaticName(), "__VOK_MEMPOOL_99999");
-  EXPECT_EQ(MgrRegistry::NextAutomaticName(), "__VOK_MEMPOOL_100000");
-}
-
-TEST(Registry, AssignedHandle) {
-  Mgr a("a");
-  Mgr b("b");
-  BucketMgr* const poolOfA = a.GetBucketMgr();
-  EXPECT_EQ(&(a = b), &a);
-  EXPECT_EQ(a.GetBucketMgr(), b.GetBucketMgr());
-  EXPECT_STREQ(a.GetName(), "b");
-  EXPECT_TRUE(GetMgr("a") == &a && GetMgr("b") == &b && GetNumMgrs() == 2);
-  EXPECT_TRUE(poolOfA->mgr == &a && b.GetBucketMgr()->mgr == &b && poolOfA->name == "a");
-  std::memcpy(static_cast<void*>(&a), &poolOfA, sizeof a); // so that both can end
+  EXPECT_GT(k, 8u);
+  expectNext(Mgr().GetName());
+  while (number < 100010)
+    expectNext(MgrRegistry::NextAutomaticName());
+  std::locale::global(before);
 }
 
 } // namespace

@@ -1,65 +1,25 @@
-// The texts of the reports, to the blank: golden texts of whole reports, and of what the state of
-// the stream or a damage changes in them. The pools stand on an arena, so that addresses are the
-// same in every run.
-#include "support/ArenaHeap.h"
-#include "support/Process.h"
+// The texts of the reports, to the space: golden texts of whole reports, and of what the state of
+// the stream or a damage changes in them. The pools are on an arena, so that addresses are the same
+// in every run.
+#include "support/Pools.h"
 
-#include "MemPool"
 #include "engine/Bucket.h"
-#include "engine/BucketMgr.h"
 #include "engine/ExtRec.h"
-#include "services/Observers.h"
 
-#include <algorithm>
 #include <cfenv>
 #include <cstdlib>
-#include <cstring>
 #include <fstream>
-#include <gmock/gmock.h>
 #include <iomanip>
-#include <iostream>
-#include <memory>
 #include <regex>
 #include <span>
 
-using namespace VOK::MemPool;
 using testing::HasSubstr;
 
 namespace {
 
-struct Output : std::stringbuf {
-  std::ptrdiff_t flushes = 0;
-  int sync() override { return ++flushes, 0; }
-};
-
-class Reports : public testing::Test {
+class Reports : public Pools {
 protected:
-  ArenaHeap heap;
-  const Observers::Quiet looking; // into each byte of the arena
   Output output;
-  std::streambuf* const real = std::cout.rdbuf(&output);
-  std::vector<std::unique_ptr<Mgr>> pools;
-
-  ~Reports() override {
-    pools.clear();
-    EXPECT_THAT(heap.Finish(), testing::IsEmpty());
-    std::cout.rdbuf(real);
-    std::cout.copyfmt(std::ios(nullptr));
-  }
-
-  Mgr& Make(const std::string& name, const std::string& settings = "") {
-    Set("bucket=4010 align=4 max=1000 min=8 keep=0 on=1 trace=0 " + settings);
-    auto& pool = pools.emplace_back();
-    const ArenaHeap::Use use;
-    return *(pool = std::make_unique<Mgr>(name.c_str()));
-  }
-
-  static std::vector<void*> Alloc(Mgr& pool, unsigned number, unsigned size) {
-    std::vector<void*> blocks(number);
-    const ArenaHeap::Use use;
-    std::generate(blocks.begin(), blocks.end(), [&] { return pool.Alloc(size); });
-    return blocks;
-  }
 
   static void Write(const Mgr& pool, std::ostream& os) {
     pool.GetBucketMgr()->Dbg(os, 6, true, true, true);
@@ -68,9 +28,8 @@ protected:
   /// What `report` writes on standard output, messages with "#####" for their source line.
   std::string Report(const std::function<void()>& report) {
     report();
-    const std::string text = output.str();
-    EXPECT_EQ(std::count(text.begin(), text.end(), '\n'), std::exchange(output.flushes, 0));
-    output.str("");
+    const std::string text = output.Text();
+    EXPECT_EQ(std::ranges::count(text, '\n'), std::exchange(output.numFlushes, 0));
     static const std::regex place(":../s/MemPool:[ 0-9]{5}: ");
     return std::regex_replace(text, place, ":../s/MemPool:#####: ");
   }
@@ -99,12 +58,12 @@ std::string Changes(const std::string& before, const std::string& after) {
 // Four buckets, one of them full, with 505 + 3 used records; two large blocks.
 TEST_F(Reports, Pool) {
   Mgr& pool = Make("demo");
-  const std::vector<void*> records = Alloc(pool, 750, 12);
+  const std::vector<std::uint8_t*> records = Alloc(pool, 750, 12);
   for (unsigned i = 0; i < 750; ++i)
     if (i < 5 || i >= 510) pool.Free(records[i]);
   Alloc(pool, 3, 100);
-  Alloc(pool, 1, 1500);
-  Alloc(pool, 1, 2000);
+  Alloc(pool, 1500);
+  Alloc(pool, 2000);
   ExpectGolden("demo", Report([&] { pool.Dbg(); }));
 }
 
@@ -115,14 +74,14 @@ TEST_F(Reports, PoolInDetail) {
   Mgr& pool = Make("detailed", "bucket=130 max=124 keep=1");
   pool.Free(Alloc(pool, 3, 3)[1]);
   Alloc(pool, 10, 8);
-  const std::vector<void*> records = Alloc(pool, 24, 9);
+  const std::vector<std::uint8_t*> records = Alloc(pool, 24, 9);
   for (const unsigned i : {3u, 0u, 1u, 2u, 7u, 6u, 5u, 4u, 22u, 16u, 19u, 9u})
     pool.Free(records[i]);
   heap.FailAt(2);
-  EXPECT_THROW(Alloc(pool, 1, 20), std::bad_alloc);
+  EXPECT_THROW(Alloc(pool, 20), std::bad_alloc);
   pool.Free(Alloc(pool, 2, 117)[0]);
   Alloc(pool, 2, 1501);
-  ExtRec::FromData(Alloc(pool, 1, 121)[0])->length = 12345678;
+  ExtRec::FromData(Alloc(pool, 121))->length = 12345678;
   ExpectGolden("detailed", Report([&] { pool.DbgDetailed(); }));
 
   // A report to a dead stream ends as any other. An exception comes through and nothing is left.
@@ -141,8 +100,8 @@ TEST_F(Reports, AllPools) {
   Mgr& unused = Make("unused");
   Mgr& disabled = Make("disabled", "on=0");
   Mgr& emptied = Make("emptied", "align=8 min=20 max=500 bucket=5000");
-  void* const block = Alloc(disabled, 1, 100)[0];
-  emptied.Free(Alloc(emptied, 1, 100)[0]);
+  void* const block = Alloc(disabled, 100);
+  emptied.Free(Alloc(emptied, 100));
   ExpectGolden("all", Report([] { Dbg(); }));
   disabled.Free(block);
 
@@ -152,12 +111,13 @@ TEST_F(Reports, AllPools) {
   Alloc(unused, 99, 9);
   Alloc(unused, 50, 40);
   BucketMgr* const own = disabled.GetBucketMgr();
-  disabled = emptied;
+  EXPECT_TRUE(&(disabled = emptied) == &disabled && GetMgr("disabled") == &disabled);
+  EXPECT_TRUE(own->mgr == &disabled && disabled.GetName() == std::string("emptied"));
   ExpectGolden("all-detailed", Report([] { DbgDetailed(); }));
   std::memcpy(static_cast<void*>(&disabled), &own, sizeof(Mgr));
 }
 
-// The state under which a report starts is part of its text, and some of it stays behind.
+// The state under which a report starts is part of its text, and some of it stays.
 TEST_F(Reports, StateOfTheStream) {
   const std::pair<const char*, void (*)(std::ostream&)> states[] = {
       {"left, fill #", [](std::ostream& os) { os << std::left << std::setfill('#'); }},
@@ -199,31 +159,28 @@ TEST_F(Reports, StateOfTheStream) {
 
 TEST_F(Reports, DamagedBucket) {
   Mgr& pool = Make("damaged", "bucket=162 max=16");
-  const std::vector<void*> records = Alloc(pool, 5, 12);
+  const std::vector<std::uint8_t*> records = Alloc(pool, 5, 12);
   pool.Free(records[1]);
   pool.Free(records[3]);
   Bucket& bucket = *Bucket::FromData(records[0]);
   const std::span bytes(reinterpret_cast<std::uint8_t*>(&bucket), recsBaseOffset + bucket.recsSize);
-  ArenaHeap::Open(bytes.data(), bytes.size());
+  ArenaHeap::Unpoison(bytes.data(), bytes.size());
   const std::vector<std::uint8_t> whole(bytes.begin(), bytes.end());
   std::ostringstream before;
   Write(pool, before);
 
-  using Fields = std::map<std::string, std::uint16_t*>;
-  const Fields fields{{"recsSize", &bucket.recsSize},
-                      {"recSize", &bucket.recSize},
-                      {"freeHead", &bucket.freeHead},
-                      {"freeRecs", &bucket.freeRecs}};
+  // A field is at its distance from offset 0, as a record is.
+  const std::map<std::string, int> fields{
+      {"recsSize", -6}, {"recSize", -4}, {"freeHead", -2}, {"freeRecs", 0}};
   // Pairs of a field or an offset, and its new value; a record has its type 2 bytes on.
   const auto damage = [&](const std::string& text) {
-    std::copy(whole.begin(), whole.end(), bytes.begin());
+    std::ranges::copy(whole, bytes.begin());
     std::istringstream words(text);
     std::uint16_t value;
-    for (std::string place; words >> place >> value;)
-      if (fields.contains(place))
-        *fields.at(place) = value;
-      else
-        bucket.RecAt(static_cast<unsigned>(std::stoul(place)))->SetOffset(value);
+    for (std::string place; words >> place >> value;) {
+      const int offset = fields.contains(place) ? fields.at(place) : std::stoi(place);
+      std::memcpy(&bytes[recsBaseOffset] + offset, &value, sizeof value);
+    }
   };
   const auto report = [&](bool showRecs, bool showFreeList) {
     return Report([&] { bucket.Dbg(std::cout, 1000, 1, showRecs, showFreeList); });
@@ -231,7 +188,7 @@ TEST_F(Reports, DamagedBucket) {
   EXPECT_THAT(report(true, false), Not(HasSubstr("FREE LIST")));
   EXPECT_THAT(report(false, true), Not(HasSubstr("ALL RECORDS")));
 
-  damage("recSize 15 18 50"); // each warning stands below the row that sets it off
+  damage("recSize 15 18 50"); // each warning is below the row that sets it off
   ExpectGolden("warnings", report(true, true));
 
   // What each damage changes, and the warnings, on standard output wherever the report goes.
@@ -250,8 +207,8 @@ TEST_F(Reports, DamagedBucket) {
   }
   ExpectGolden("damages", changes);
 
-  // All walks end and stay in the block, which the address sanitizer watches, and write nothing
-  // into it. Nothing in a bucket tells how large its block is, so its area only shrinks.
+  // All walks end and stay in the block, which the address sanitizer checks, and write nothing
+  // into it. Nothing in a bucket documents the size of its block, so its area only shrinks.
   std::istringstream places("recsSize recSize freeHead freeRecs 2 4 18 20 34 36 50 52 66 68 82 84 "
                             "98 100 114 116 130 132 146 148");
   for (std::string place; places >> place;)
@@ -260,9 +217,8 @@ TEST_F(Reports, DamagedBucket) {
       damage(place + " " + std::to_string(value));
       const std::vector<std::uint8_t> damaged(bytes.begin(), bytes.end());
       Write(pool, std::cout);
-      EXPECT_LT(std::exchange(output.flushes, 0), 600) << place << ' ' << value;
-      EXPECT_TRUE(std::equal(damaged.begin(), damaged.end(), bytes.begin()));
-      output.str("");
+      EXPECT_LT(std::exchange(output.numFlushes, 0), 600) << place << ' ' << value;
+      EXPECT_TRUE(std::ranges::equal(damaged, bytes) && !output.Text().empty());
     }
   damage("");
 }

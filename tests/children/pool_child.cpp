@@ -3,16 +3,8 @@
 // library, and as a host, which is linked with neither and loads them.
 #include "support/Process.h"
 
-#include <MemPool>
-
-#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
-#include <cstring>
-#include <iostream>
-#include <memory>
-#include <new>
-#include <vector>
 
 #ifdef _WIN32
 #include <windows.h>
@@ -45,7 +37,7 @@ extern "C" bool Act(const std::string& name, State& state);
 
 namespace {
 
-// Never destroyed, so that a leak checker finds in it what exists at the end.
+// Never destroyed, so that a leak check finds in it what exists at the end.
 auto& ownState = *new State;
 void* handle;
 decltype(&Act) actOfClient;
@@ -65,7 +57,7 @@ const std::unique_ptr<Mgr> named(wanted ? new Mgr("client") : nullptr);
 const std::unique_ptr<Mgr> nameless(wanted ? new Mgr : nullptr);
 
 void Alloc(State& s) {
-  s.blocks.push_back(s.Pool().Alloc(s.Number()));
+  s.blocks.push_back(s.Pool().Alloc(std::stoull(s.operand)));
   std::memset(s.blocks.back(), 1, std::min(s.Number(), 1U << 16));
 }
 
@@ -75,15 +67,26 @@ void Build(State& s) {
     s.Pool().Alloc(992);
 }
 
-// The compiler must not drop a write that nobody reads.
+// The compiler must not drop a write that nothing reads.
 void Write(State& s) { static_cast<volatile char*>(s.blocks.back())[std::stol(s.operand)] = 2; }
 
+// Where the pool of that name is in the list of this program; null is a name, too.
+void Find(State& s) {
+  const char* const name = s.operand.empty() ? nullptr : s.operand.c_str();
+  std::cout << std::ranges::find(s.pools, GetMgr(name)) - s.pools.begin() << '\n';
+}
+
+// By both lists, which append to what is in them.
 void ShowNames(State&) {
-  std::vector<Mgr*> mgrs;
+  std::vector<Mgr*> mgrs(1);
   GetMgrs(mgrs);
-  std::cout << GetNumMgrs() << " pools:";
-  for (const Mgr* mgr : mgrs)
-    std::cout << ' ' << mgr->GetName();
+  VOK::vector<Mgr*> own;
+  own.Append(nullptr);
+  GetMgrs(own);
+  std::cout << GetNumMgrs() << " of " << own.capacity
+            << (std::ranges::equal(own, mgrs) ? ":" : "?");
+  for (std::size_t i = 1; i < mgrs.size(); ++i)
+    std::cout << ' ' << mgrs[i]->GetName();
   std::cout << std::endl;
 }
 #endif
@@ -101,6 +104,7 @@ constexpr struct {
     {"set", [](State& s) { Set(s.operand); }},
     {"pool", [](State& s) { s.pools.push_back(new Mgr(s.operand.c_str())); }},
     {"nameless", [](State& s) { s.pools.push_back(new Mgr); }},
+    {"find", Find},
     {"turn", [](State& s) { std::reverse(s.pools.begin(), s.pools.end()); }},
     {"drop", [](State& s) { delete &s.Pool(), s.pools.pop_back(); }},
     {"build", Build},
@@ -151,7 +155,7 @@ bool Act(const std::string& name, State& state) {
 }
 
 #if defined(__GLIBC__) && !defined(VOK_MEMPOOL_HOST)
-// Stands in for the platform's function, to show what is looked up and in which order.
+// Replaces the platform's function, to show what is looked up and in which order.
 char* secure_getenv(const char* key) noexcept {
   if (std::getenv("ZOR_SHOW_KEYS") != nullptr) std::printf("%s\n", key);
   return std::getenv(key);

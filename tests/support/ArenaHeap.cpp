@@ -1,7 +1,6 @@
 #include "support/ArenaHeap.h"
 
 #include <algorithm>
-#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <new>
@@ -16,7 +15,7 @@
 #include <sanitizer/asan_interface.h>
 #else
 #define ASAN_POISON_MEMORY_REGION(place, size) (static_cast<void>(place), static_cast<void>(size))
-#define ASAN_UNPOISON_MEMORY_REGION(place, size) (static_cast<void>(place), static_cast<void>(size))
+#define ASAN_UNPOISON_MEMORY_REGION ASAN_POISON_MEMORY_REGION
 #endif
 #if __has_include(<valgrind/memcheck.h>)
 #include <valgrind/memcheck.h>
@@ -31,79 +30,74 @@ constexpr std::uintptr_t arenaPlace =
     static_cast<std::uintptr_t>(sizeof(void*) == 8 ? 0x200000000000 : 0x20000000);
 constexpr std::size_t arenaSize = 256u << 20;
 constexpr std::size_t guard = 16; // before each block and after the last
-constexpr std::byte guardByte{0xFD};
-
-// As any heap does, the arena tells the memory-checking tools what may be touched.
-void Close(const void* place, std::size_t size) {
-  ASAN_POISON_MEMORY_REGION(place, size);
-  static_cast<void>(VALGRIND_MAKE_MEM_NOACCESS(place, size));
-}
 
 ArenaHeap* heap = nullptr;
-thread_local bool inUse = false;
 
-// Fresh memory at that place, or whatever the platform gives if it is in use.
-void* Map(void* place, std::size_t size) {
-#ifdef _WIN32
-  return VirtualAlloc(place, size, MEM_RESERVE | MEM_COMMIT, PAGE_READWRITE);
-#else
-  return mmap(place, size, PROT_READ | PROT_WRITE,
-              MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE | MAP_FIXED_NOREPLACE, -1, 0);
-#endif
+// As any heap does, the arena reports to the memory-checking tools what may be accessed.
+void Poison(const void* from, std::size_t size) {
+  ASAN_POISON_MEMORY_REGION(from, size);
+  static_cast<void>(VALGRIND_MAKE_MEM_NOACCESS(from, size));
 }
 
-std::byte* Arena() {
-  static void* const place = Map(reinterpret_cast<void*>(arenaPlace), arenaSize);
-  if (reinterpret_cast<std::uintptr_t>(place) != arenaPlace) {
-    std::fputs("ArenaHeap: the arena's place is in use\n", stderr);
-    std::abort();
-  }
-  return static_cast<std::byte*>(place);
+// Fresh memory at its place, where nothing else may be.
+std::uint8_t* Arena() {
+  static void* const place =
+#ifdef _WIN32
+      VirtualAlloc(reinterpret_cast<void*>(arenaPlace), arenaSize, MEM_RESERVE | MEM_COMMIT,
+                   PAGE_READWRITE);
+#else
+      mmap(reinterpret_cast<void*>(arenaPlace), arenaSize, PROT_READ | PROT_WRITE,
+           MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE | MAP_FIXED_NOREPLACE, -1, 0);
+#endif
+  if (reinterpret_cast<std::uintptr_t>(place) != arenaPlace) std::abort();
+  return static_cast<std::uint8_t*>(place);
 }
 
 // So that a block's last granule of 16 and the guard after it are always ours.
 std::size_t RoomOf(std::size_t size) { return (std::max<std::size_t>(size, 1) + 15) / 16 * 16; }
 
-// Calls `visit` with each byte of the guards of a block and with what it must hold.
-template <class Visit>
-void ForGuards(std::byte* p, std::size_t size, const Visit& visit) {
-  for (unsigned i = 0; i < guard; ++i)
-    visit(*(p - guard + i), i < guard - 4 ? guardByte : std::byte(size >> 8 * (i + 4 - guard)));
-  for (std::byte* b = p + size; b < p + RoomOf(size) + guard - 4; ++b)
-    visit(*b, guardByte);
+// Writes a block with the guards around it if it is new; whether all of that is in place.
+bool IsFramed(std::uint8_t* p, const Bytes& block, bool isNew) {
+  Bytes frame(guard + RoomOf(block.size()) + guard - 4, 0xFD);
+  for (unsigned i = 0; i < 4; ++i)
+    frame[guard - 4 + i] = static_cast<std::uint8_t>(block.size() >> 8 * i);
+  std::ranges::copy(block, frame.begin() + guard);
+  ArenaHeap::Unpoison(p - guard, frame.size());
+  if (isNew) std::ranges::copy(frame, p - guard);
+  const bool isFramed = std::equal(frame.begin(), frame.end(), p - guard);
+  Poison(p - guard, frame.size());
+  ArenaHeap::Unpoison(p, block.size());
+  return isFramed;
 }
 
 void* Allocate(std::size_t size, ArenaHeap::Form form) {
-  if (heap != nullptr && inUse) return heap->Take(size, form);
+  if (heap != nullptr && ArenaHeap::inUse) return heap->Allocate(size, form);
   if (void* const p = std::malloc(std::max<std::size_t>(size, 1))) return p;
   throw std::bad_alloc();
 }
 
-void Release(void* p, ArenaHeap::Form form, const std::size_t* size = nullptr) {
+void Free(void* p, ArenaHeap::Form form, const std::size_t* size = nullptr) {
   if (reinterpret_cast<std::uintptr_t>(p) - arenaPlace >= arenaSize)
     std::free(p);
   else if (heap != nullptr)
-    heap->GiveBack(p, form, size);
+    heap->Free(p, form, size);
 }
 
 } // namespace
 
-void ArenaHeap::Open(const void* from, std::size_t size) {
+void ArenaHeap::Unpoison(const void* from, std::size_t size) {
   ASAN_UNPOISON_MEMORY_REGION(from, size);
   static_cast<void>(VALGRIND_MAKE_MEM_DEFINED(from, size));
 }
 
 ArenaHeap::ArenaHeap() : end(Arena() + guard) {
   heap = this;
-  Close(Arena(), arenaSize);
+  Poison(Arena(), arenaSize);
 }
 
 ArenaHeap::~ArenaHeap() { heap = nullptr; }
 
-ArenaHeap::Use::Use(bool arena) : before(inUse) { inUse = arena; }
-ArenaHeap::Use::~Use() { inUse = before; }
-
-void* ArenaHeap::Take(std::size_t size, Form form) {
+void* ArenaHeap::Allocate(std::size_t size, Form form) {
   const Use real(false);
   const auto left = static_cast<std::size_t>(Arena() + arenaSize - end);
   const bool fails = failIn > 0 && --failIn == 0;
@@ -113,66 +107,51 @@ void* ArenaHeap::Take(std::size_t size, Form form) {
     if (handler == nullptr) throw std::bad_alloc();
     const Use again;
     handler();
-    return Take(size, form);
+    return Allocate(size, form);
   }
-  std::vector<std::byte*>& sameRoom = spare[RoomOf(size)];
-  std::byte* p = end;
-  if (sameRoom.empty()) {
-    end += RoomOf(size) + guard;
-  } else {
-    p = sameRoom.back();
-    sameRoom.pop_back();
-  }
-  Open(p - guard, guard + RoomOf(size) + guard);
-  ForGuards(p, size, [](std::byte& guarded, std::byte wanted) { guarded = wanted; });
-  std::memset(p, delivered, size);
-  Close(p - guard, guard + RoomOf(size) + guard);
-  Open(p, size);
+  std::vector<std::uint8_t*>& sameRoom = spare[RoomOf(size)];
+  if (sameRoom.empty()) sameRoom.push_back(std::exchange(end, end + RoomOf(size) + guard));
+  std::uint8_t* const p = sameRoom.back();
+  sameRoom.pop_back();
+  IsFramed(p, Bytes(size, delivered), true);
   live[p] = {form, size};
   events.push_back({'+', form, size, p, {}});
   return p;
 }
 
-void ArenaHeap::GiveBack(void* block, Form form, const std::size_t* size) {
+void ArenaHeap::Free(void* block, Form form, const std::size_t* size) {
   const Use real(false);
-  auto* const p = static_cast<std::byte*>(block);
+  auto* const p = static_cast<std::uint8_t*>(block);
   const auto found = live.find(p);
-  if (found == live.end()) return Fault("no block is released", 0);
-  const Block known = found->second;
-  if (known.form != form) Fault("released in the wrong form", known.size);
-  if (size != nullptr && *size != known.size) Fault("released in the wrong size", known.size);
-  CheckGuards(p, known);
-  const auto* const bytes = static_cast<const std::uint8_t*>(block);
-  events.push_back({'-', form, known.size, p, {bytes, bytes + known.size}});
+  if (found == live.end()) return Fault("a stray pointer is freed", 0);
+  const auto [madeForm, madeSize] = found->second;
+  if (madeForm != form) Fault("freed in the wrong form", madeSize);
+  if (size != nullptr && *size != madeSize) Fault("freed in the wrong size", madeSize);
+  CheckGuards(p, madeSize);
+  events.push_back({'-', form, madeSize, p, {p, p + madeSize}});
   live.erase(found);
-  std::memset(p, released, known.size);
-  Close(p, known.size);
-  spare[RoomOf(known.size)].push_back(p);
+  std::memset(p, freed, madeSize);
+  Poison(p, madeSize);
+  spare[RoomOf(madeSize)].push_back(p);
 }
 
 const std::vector<std::string>& ArenaHeap::Finish() {
-  for (const auto& [p, block] : live) {
-    CheckGuards(p, block);
-    Fault("not released", block.size);
+  for (const auto& [p, made] : live) {
+    CheckGuards(p, made.second);
+    Fault("not freed", made.second);
   }
   return faults;
 }
 
-void ArenaHeap::CheckGuards(std::byte* p, const Block& block) {
-  const std::size_t whole = guard + RoomOf(block.size) + guard;
-  bool isWhole = true;
-  Open(p - guard, whole);
-  ForGuards(p, block.size, [&](std::byte found, std::byte wanted) { isWhole &= found == wanted; });
-  Close(p - guard, whole);
-  Open(p, block.size);
-  if (!isWhole) Fault("written beyond its bounds", block.size);
+void ArenaHeap::CheckGuards(std::uint8_t* p, std::size_t size) {
+  if (!IsFramed(p, {p, p + size}, false)) Fault("written beyond its bounds", size);
 }
 
 // The library uses no other form; of those, the standard library uses one.
 void* operator new(std::size_t size, const std::nothrow_t&) noexcept { return std::malloc(size); }
 void* operator new(std::size_t size) { return Allocate(size, ArenaHeap::Form::Plain); }
 void* operator new[](std::size_t size) { return Allocate(size, ArenaHeap::Form::Array); }
-void operator delete(void* p) noexcept { Release(p, ArenaHeap::Form::Plain); }
-void operator delete[](void* p) noexcept { Release(p, ArenaHeap::Form::Array); }
-void operator delete(void* p, std::size_t n) noexcept { Release(p, ArenaHeap::Form::Plain, &n); }
-void operator delete[](void* p, std::size_t n) noexcept { Release(p, ArenaHeap::Form::Array, &n); }
+void operator delete(void* p) noexcept { Free(p, ArenaHeap::Form::Plain); }
+void operator delete[](void* p) noexcept { Free(p, ArenaHeap::Form::Array); }
+void operator delete(void* p, std::size_t n) noexcept { Free(p, ArenaHeap::Form::Plain, &n); }
+void operator delete[](void* p, std::size_t n) noexcept { Free(p, ArenaHeap::Form::Array, &n); }

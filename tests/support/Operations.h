@@ -3,14 +3,12 @@
 #ifndef VOK_MEMPOOL_TESTS_OPERATIONS_H
 #define VOK_MEMPOOL_TESTS_OPERATIONS_H
 
-#include "support/Process.h"
 #include "support/Reference.h"
 
 #include "engine/BucketMgr.h"
 #include "engine/Invariants.h"
 #include "services/Observers.h"
 
-#include <functional>
 #include <optional>
 
 class Operations {
@@ -159,7 +157,7 @@ private:
       if (each.mgr) expected = std::max(expected, each.reference->ExtSize(p));
     Demand(pool.mgr->GetSize(p) == expected, "GetSize");
     Demand(pool.mgr->Contains(p) == (expected != 0), "Contains");
-    // An ExtRec within another list can't be told from one of this.
+    // The pool can't distinguish an ExtRec within another list from its own.
     const bool isUnknown = other.reference->ExtSize(p) > 0 && !other.reference->IsFirstExt(p) &&
                            !pool.reference->exts.empty();
     if (&pool != &other && pool.reference->settings.on && !isUnknown) FreeBoth(pool, p);

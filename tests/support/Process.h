@@ -1,15 +1,21 @@
-// What a test changes of its process: the settings and the locale.
+// What a test changes of its process: the settings, the locale, the buffer of a stream. It includes
+// what most tests use of the standard library.
 #ifndef VOK_MEMPOOL_TESTS_PROCESS_H
 #define VOK_MEMPOOL_TESTS_PROCESS_H
 
 #include "MemPool"
 
+#include <algorithm>
+#include <cstring>
+#include <functional>
+#include <iostream>
 #include <locale>
 #include <map>
+#include <memory>
 #include <sstream>
-#include <string>
+#include <vector>
 
-/// Sets what the text names: "bucket=4010 align=4 max=1000 min=8 keep=0 trace=0 on=0".
+/// Sets what the text names.
 inline void Set(const std::string& words) {
   using namespace VOK::MemPool;
   static const std::map<std::string, void (*)(unsigned)> setters = {
@@ -26,8 +32,10 @@ inline void Set(const std::string& words) {
     setters.at(name)(number);
 }
 
+/// The settings are the default ones again when it ends.
 struct KeepSettings {
-  ~KeepSettings() { Set("bucket=4010 align=4 max=1000 min=8 keep=0 trace=0 on=0"); }
+  static constexpr auto defaults = "bucket=4010 align=4 max=1000 min=8 keep=0 trace=0 on=0 ";
+  ~KeepSettings() { Set(defaults); }
 };
 
 inline bool dead = false; ///< locales and buffers of a test throw, as those of a program may
@@ -43,10 +51,41 @@ inline std::locale Grouping(const char* sizes = "\1") {
   return {std::locale::classic(), new Format(sizes)};
 }
 
-/// While it lives, the global locale groups digits.
-struct GroupingLocale {
-  ~GroupingLocale() { std::locale::global(before); }
-  const std::locale before = std::locale::global(Grouping());
+/// Replaces a stream's buffer while it lives, and ends by restoring the stream's whole state. The
+/// stream throws what it can.
+class Output : std::streambuf {
+public:
+  explicit Output(std::ostream& stream_ = std::cout) : stream(stream_) {
+    format.copyfmt(stream);
+    stream.exceptions(std::ios::badbit | std::ios::failbit);
+    text.reserve(1000); // so that a few lines allocate nothing
+  }
+  ~Output() override {
+    stream.copyfmt(format);
+    stream.rdbuf(before);
+  }
+  /// What was written since the last call.
+  std::string Text() {
+    const std::string written = text;
+    text.clear();
+    return written;
+  }
+  std::ptrdiff_t numFlushes = 0;
+
+protected:
+  int sync() override { return ++numFlushes, dead ? throw 1 : 0; }
+
+private:
+  void imbue(const std::locale&) override { text += "imbued"; }
+  int_type overflow(int_type c) override { return text += dead ? throw 1 : char(c), c; }
+  std::streamsize xsputn(const char* from, std::streamsize size) override {
+    return text.append(dead ? throw 1 : from, std::size_t(size)), size;
+  }
+
+  std::ostream& stream;
+  std::streambuf* const before = stream.rdbuf(this);
+  std::ios format{nullptr};
+  std::string text;
 };
 
 #endif

@@ -5,25 +5,11 @@
 #define VOK_MEMPOOL_TESTS_REFERENCE_H
 
 #include "support/ArenaHeap.h"
+#include "support/Process.h"
 
-#include "MemPool"
-
-#include <algorithm>
-#include <cstdint>
-#include <cstring>
 #include <deque>
-#include <initializer_list>
-#include <iostream>
-#include <map>
-#include <new>
-#include <sstream>
 #include <stdexcept>
-#include <streambuf>
-#include <string>
-#include <utility>
-#include <vector>
 
-using Bytes = std::vector<std::uint8_t>;
 using Form = ArenaHeap::Form;
 
 inline void Demand(bool condition, const char* what) {
@@ -31,37 +17,34 @@ inline void Demand(bool condition, const char* what) {
 }
 
 /// What a call did to the heap and to std::cout, for the reference to say the same step by step.
-class Log : std::streambuf {
+class Log : public Output {
 public:
   explicit Log(ArenaHeap& heap_) : heap(heap_) {}
-  ~Log() override { std::cout.rdbuf(before); }
 
-  /// The next event, which must be one of these kinds; '|' is the line that `text` ends with.
-  const ArenaHeap::Event& Next(const std::string& kinds, const std::string& text = "") {
+  /// The next event, which must be one of these kinds; '|' is the flush after `line`.
+  const ArenaHeap::Event& Next(const std::string& kinds, const std::string& line = "") {
     Demand(at < heap.events.size() && kinds.find(heap.events[at].kind) != std::string::npos,
            "another use of heap or output");
-    expected += text;
+    expected += line;
     return heap.events[at++];
   }
   void End() {
     Demand(at == heap.events.size() && heap.faults.empty(), "heap or output used more");
-    Demand(std::exchange(written, {}) == std::exchange(expected, {}), "other lines");
+    Demand(Text() == std::exchange(expected, {}), "other lines");
     heap.events.clear();
     at = 0;
   }
 
 private:
-  int_type overflow(int_type c) override {
+  int sync() override {
     const ArenaHeap::Use real(false);
-    written += traits_type::to_char_type(c);
-    if (c == '\n') heap.events.push_back({'|', {}, 0, nullptr, {}});
-    return c;
+    heap.events.push_back({'|', {}, 0, nullptr, {}});
+    return 0;
   }
 
   ArenaHeap& heap;
-  std::streambuf* const before = std::cout.rdbuf(this);
   std::size_t at = 0;
-  std::string written, expected;
+  std::string expected;
 };
 
 class Reference {
@@ -72,12 +55,13 @@ public:
 
     /// What a pool makes of them.
     Settings Normalised() const {
-      Settings s = *this;
-      s.bucketSize = std::min(bucketSize, 65535u);
-      s.dataAlignment = std::max(dataAlignment % 65536, 1u);
-      s.maxRecSize = maxRecSize / s.dataAlignment * s.dataAlignment;
-      s.minRecSize = s.Rounded(minRecSize);
-      return s;
+      const std::uint32_t unit = std::max(dataAlignment % 65536, 1u);
+      return {std::min(bucketSize, 65535u),
+              unit,
+              maxRecSize / unit * unit,
+              std::max((minRecSize + unit - 1) / unit, 1u) * unit,
+              keepEmptyBuckets,
+              on};
     }
     bool IsPossible() const {
       const Settings s = Normalised();
@@ -104,26 +88,26 @@ public:
 
   Reference(Log& log_, const Settings& given, VOK::MemPool::Mgr* mgr_)
       : settings(given.Normalised()), log(log_), mgr(mgr_) {
-    pool = Take(Form::Plain, 0);
+    pool = AllocBlock(Form::Plain, 0);
     blocks[pool + sizeof(std::string)].resize(3 * P + 26);
     Trace("c:");
     try {
-      table = Take(Form::Array, settings.NumGroups() * P, 0);
-      node = Take(Form::Plain, 0);
+      table = AllocBlock(Form::Array, settings.NumGroups() * P, 0);
+      node = AllocBlock(Form::Plain, 0);
     } catch (const std::bad_alloc&) {
       if (table != nullptr) End();
-      Release(Form::Plain, pool);
+      FreeBlock(Form::Plain, pool);
       throw;
     }
   }
   void Destroy() {
-    Release(Form::Plain, node);
+    FreeBlock(Form::Plain, node);
     End();
-    Release(Form::Plain, pool);
+    FreeBlock(Form::Plain, pool);
   }
   std::uint8_t* Alloc(std::uint32_t size) {
     const std::uint32_t dataSize = settings.Rounded(size);
-    std::uint8_t* const p = !settings.on                         ? Take(Form::Array, size)
+    std::uint8_t* const p = !settings.on                         ? AllocBlock(Form::Array, size)
                             : dataSize + 4 > settings.maxRecSize ? AllocExt(size)
                                                                  : AllocRec(dataSize);
     Trace("a:", ":" + Text(p) + ":" + std::to_string(size));
@@ -132,7 +116,7 @@ public:
   bool Free(std::uint8_t* p) {
     if (p == nullptr) return false;
     Trace("f:", ":" + Text(p) + ":");
-    if (!settings.on) return Release(Form::Array, p), true;
+    if (!settings.on) return FreeBlock(Form::Array, p), true;
     if (RecordSize(p) > 0) return FreeRec(Around(p), p), true;
     if (ExtSize(p) == 0) return false;
     Scrub(p - extHeader, extHeader);
@@ -140,22 +124,18 @@ public:
     return true;
   }
   void Clear() {
-    Refresh();
-    for (std::uint8_t* ext : std::exchange(exts, {}))
-      Release(Form::Array, ext);
+    FreeExts();
     for (const auto& [index, group] : std::exchange(groups, {})) {
       for (std::uint8_t* bucket : group.all)
         Scrub(bucket, 5 * P + 4);
-      Release(Form::Plain, group.at);
+      FreeBlock(Form::Plain, group.at);
     }
     buckets.clear();
     Refresh();
   }
   bool Reset() {
     if (!settings.on) return false;
-    Refresh();
-    for (std::uint8_t* ext : std::exchange(exts, {}))
-      Release(Form::Array, ext);
+    FreeExts();
     for (auto& [index, group] : groups) {
       group.withFree = group.all;
       for (std::uint8_t* bucket : group.all)
@@ -192,22 +172,18 @@ public:
   void Refresh() {
     std::ranges::fill(blocks[table], std::uint8_t{0});
     for (const auto& [index, group] : groups) {
-      Put(table, index * P, {group.at});
-      Put(group.at, 0,
-          {pool, At(group.all, 0), At(group.all, group.all.size() - 1), At(group.withFree, 0)});
-      Put(group.at, 4 * P, {Number(group.all.size()), Number(group.withFree.size())});
-      Put(group.at, 4 * P + 8, {Short(group.recSize - 4), Short(Total(group))});
+      Put(table, index * P, group.at);
+      Put(group.at, 0, pool, At(group.all, 0), At(group.all, group.all.size() - 1),
+          At(group.withFree, 0), Number(group.all.size()), Number(group.withFree.size()),
+          Short(group.recSize - 4), Short(Total(group)));
       for (std::uint8_t* bucket : group.all)
         RefreshBucket(bucket);
     }
     for (std::size_t i = 0; i < exts.size(); ++i)
-      Put(exts[i], 0, {At(exts, i + 1), At(exts, i - 1)});
-    std::uint8_t* const fields = pool + sizeof(std::string); // of the pool, after its name
-    Put(fields, 0, {reinterpret_cast<std::uint8_t*>(mgr), table, At(exts, 0)});
-    Put(fields, 3 * P,
-        {settings.NumGroups(), Number(exts.size()), settings.bucketSize, settings.dataAlignment,
-         settings.maxRecSize, settings.minRecSize});
-    Put(fields, 3 * P + 24, {settings.keepEmptyBuckets, settings.on});
+      Put(exts[i], 0, At(exts, i + 1), At(exts, i - 1));
+    Put(pool + sizeof(std::string), 0, mgr, table, At(exts, 0), settings.NumGroups(),
+        Number(exts.size()), settings.bucketSize, settings.dataAlignment, settings.maxRecSize,
+        settings.minRecSize, settings.keepEmptyBuckets, settings.on);
   }
 
 private:
@@ -229,12 +205,12 @@ private:
   std::uint8_t* AllocRec(std::uint32_t dataSize) {
     const std::uint32_t index = settings.Index(dataSize);
     if (!groups.contains(index)) {
-      std::uint8_t* const at = Take(Form::Plain, 4 * P + 12);
+      std::uint8_t* const at = AllocBlock(Form::Plain, 4 * P + 12);
       groups[index] = {at, settings.Capacity(dataSize) + 4, {}, {}};
     }
     Group& group = groups[index];
     if (group.withFree.empty()) {
-      std::uint8_t* const at = Take(Form::Array, base + 2 + Total(group) * group.recSize);
+      std::uint8_t* const at = AllocBlock(Form::Array, base + 2 + Total(group) * group.recSize);
       buckets[at] = {&group, NewList(group), nullptr};
       group.all.push_front(at);
       group.withFree.push_front(at);
@@ -262,20 +238,17 @@ private:
     Scrub(at, 5 * P + 4);
   }
   std::uint8_t* AllocExt(std::uint32_t size) {
-    std::uint8_t* const at = Take(Form::Array, extHeader + size);
-    Put(at, 2 * P, {size});
-    Put(at, 2 * P + 4, {Byte(0xAA), Byte(0xBB), Byte(2), Byte(0xCC)});
+    std::uint8_t* const at = AllocBlock(Form::Array, extHeader + size);
+    Put(at, 2 * P, size, Byte(0xAA), Byte(0xBB), Byte(2), Byte(0xCC));
     exts.push_front(at);
     return at + extHeader;
   }
   void End() {
     Trace("d:");
     Clear();
-    Release(Form::Array, table);
+    FreeBlock(Form::Array, table);
   }
-  std::uint32_t Total(const Group& group) const {
-    return (settings.bucketSize - 2) / group.recSize;
-  }
+  std::uint32_t Total(const Group& of) const { return (settings.bucketSize - 2) / of.recSize; }
 
   // The free list of a new bucket.
   std::vector<std::uint32_t> NewList(const Group& group) const {
@@ -287,25 +260,17 @@ private:
 
   void RefreshBucket(std::uint8_t* at) {
     const auto& [group, free, next2] = buckets.at(at);
-    const std::size_t in1 = Number(std::ranges::find(group->all, at) - group->all.begin());
-    const std::size_t in2 =
-        Number(std::ranges::find(group->withFree, at) - group->withFree.begin());
     const bool isFull = free.empty();
     const std::uint32_t end = 2 + Total(*group) * group->recSize;
-    Put(at, 0,
-        {group->at, At(group->all, in1 + 1), At(group->all, in1 - 1),
-         isFull ? next2 : At(group->withFree, in2 + 1),
-         isFull ? nullptr : At(group->withFree, in2 - 1)});
-    Put(at, 5 * P,
-        {Short(end), Short(group->recSize), Short(isFull ? 0 : free.back()), Short(free.size())});
-    const auto header = [&, at = at](std::uint32_t own, std::uint32_t offset, int type) {
-      Put(at, base + own, {Byte(offset % 256), Byte(offset / 256), Byte(type)});
-    };
+    Put(at, 0, group->at, Beside(group->all, at, 1), Beside(group->all, at, -1),
+        isFull ? next2 : Beside(group->withFree, at, 1),
+        isFull ? nullptr : Beside(group->withFree, at, -1), Short(end), Short(group->recSize),
+        Short(isFull ? 0 : free.back()), Short(free.size()));
     for (std::uint32_t own = 2; own < end; own += group->recSize)
-      header(own, own, 1);
+      Put(at, base + own, Short(own), Byte(1));
     std::uint32_t next = 0;
     for (const std::uint32_t offset : free)
-      header(offset, std::exchange(next, offset), 0);
+      Put(at, base + offset, Short(std::exchange(next, offset)), Byte(0));
   }
 
   static std::uint32_t Number(auto n) { return static_cast<std::uint32_t>(n); }
@@ -314,12 +279,15 @@ private:
   static std::uint8_t* At(const List& list, std::size_t i) {
     return i < list.size() ? list[i] : nullptr;
   }
-  template <class Field>
-  void Put(std::uint8_t* block, std::size_t at, std::initializer_list<Field> fields) {
-    std::memcpy(&blocks[block][at], fields.begin(), fields.size() * sizeof(Field));
+  static std::uint8_t* Beside(const List& list, std::uint8_t* at, int step) {
+    return At(list, std::size_t(std::ranges::find(list, at) - list.begin() + step));
+  }
+  // Writes the fields one after the other.
+  void Put(std::uint8_t* block, std::size_t at, auto... fields) {
+    ((std::memcpy(&blocks[block][at], &fields, sizeof fields), at += sizeof fields), ...);
   }
 
-  std::uint8_t* Take(Form form, std::size_t size, std::uint8_t fill = ArenaHeap::delivered) {
+  std::uint8_t* AllocBlock(Form form, std::size_t size, std::uint8_t fill = ArenaHeap::delivered) {
     const ArenaHeap::Event& event = log.Next("+!");
     Demand(event.form == form && (event.size == size || form == Form::Plain), "another block");
     if (event.kind == '!') throw std::bad_alloc();
@@ -327,16 +295,21 @@ private:
     blocks[at].assign(size, fill);
     return at;
   }
-  void Release(Form form, std::uint8_t* at) {
+  void FreeBlock(Form form, std::uint8_t* at) {
     const ArenaHeap::Event& event = log.Next("-");
-    Demand(event.form == form && event.block == at, "another block is released");
-    Demand(form == Form::Plain || event.bytes == blocks[at], "other bytes are released");
+    Demand(event.form == form && event.block == at, "another block is freed");
+    Demand(form == Form::Plain || event.bytes == blocks[at], "other bytes are freed");
     blocks.erase(at);
   }
-  // Releases a block whose header is zeroed.
+  void FreeExts() {
+    Refresh();
+    for (std::uint8_t* ext : std::exchange(exts, {}))
+      FreeBlock(Form::Array, ext);
+  }
+  // Frees a block whose header is zeroed.
   void Scrub(std::uint8_t* at, std::size_t header) {
     std::fill_n(blocks[at].begin(), header, std::uint8_t{0});
-    Release(Form::Array, at);
+    FreeBlock(Form::Array, at);
   }
   void Trace(const std::string& letter, const std::string& operands = "") {
     if (VOK::MemPool::ZOR_VOK_MEMPOOL_TRACE())
@@ -344,8 +317,8 @@ private:
   }
   static std::string Text(const void* p) {
     std::ostringstream os;
-    os << std::hex << p;
-    return os.str().starts_with("0x") ? os.str().substr(2) : os.str();
+    os << std::hex << reinterpret_cast<std::uintptr_t>(p);
+    return os.str();
   }
 
   Log& log;
