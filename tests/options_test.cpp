@@ -109,6 +109,8 @@ TEST(Limit, AsksTheProgramForRoom) {
       Asked asked{plan, {}, 0, 0};
       Mgr pool("asking", Options(small).Limit(bucket + large).AtLimit(atLimit, &asked));
       asked.held = {pool.Alloc(4), pool.Alloc(4), pool.Alloc(4), pool.Alloc(4), pool.Alloc(100)};
+      EXPECT_THROW(pool.Alloc(bucket + large), std::bad_alloc);
+      EXPECT_EQ(asked.times, 0U) << "no answer makes room for this";
       if (size == 4 ? plan.servesSmall : plan.servesLarge)
         std::memset(pool.Alloc(size), 1, size);
       else

@@ -12,6 +12,7 @@
 #include "services/HeapTop.h"
 #include "services/Messages.h"
 #include "services/Observers.h"
+#include "services/Settings.h"
 #include "services/Trace.h"
 
 #include <algorithm>
@@ -20,16 +21,17 @@
 
 namespace VOK::MemPool {
 
-BucketMgr::BucketMgr(Mgr* mgr_, const std::string& name_, const Settings::Snapshot& settings)
+BucketMgr::BucketMgr(Mgr* mgr_, const std::string& name_, const Options& options)
     : name(name_), mgr(mgr_), groups(nullptr), extRecs(nullptr), numGroups(0), numExtRecs(0),
-      bucketSize(std::min(settings.bucketSize, maxBucketSize)),
-      dataAlignment(std::max(settings.dataAlignment, 1u)),
-      keepEmptyBuckets(settings.keepEmptyBuckets) {
+      bucketSize(std::min(options.bucketSize.Or(Settings::bucketSize), maxBucketSize)),
+      dataAlignment(std::max(options.dataAlignment.Or(Settings::dataAlignment), 1u)),
+      keepEmptyBuckets(options.keepEmptyBuckets.Or(Settings::keepEmptyBuckets)) {
   if (Trace::IsOn()) Trace::Constructed(this);
-  enabled = settings.on;
+  enabled = options.on.Or(!Settings::off);
 
   const RecSizeRange range =
-      Normalise(settings.minRecordSize, settings.maxRecordSize, dataAlignment);
+      Normalise(options.minRecordSize.Or(Settings::minRecordSize),
+                options.maxRecordSize.Or(Settings::maxRecordSize), dataAlignment);
   if (range.max + recHeaderSize > bucketSize)
     Messages::Error({"Unexpected condition: ", "the maximum record size is larger than ",
                      "the bucket size (", range.max, ">", bucketSize - recHeaderSize, ") [",
@@ -148,6 +150,7 @@ void BucketMgr::Clear() noexcept {
     delete &group;
     groups[i] = nullptr;
   });
+  BudgetOf(*this).held = 0;
 }
 
 bool BucketMgr::Reset() noexcept {
@@ -155,14 +158,18 @@ bool BucketMgr::Reset() noexcept {
   const Observers::Quiet quiet;
   ReportAllFree();
   ReleaseExtRecs();
-  ForEachGroup(*this, [](Group& group, std::uint32_t) { group.Reset(); });
+  std::uint64_t held = 0;
+  ForEachGroup(*this, [&held](Group& group, std::uint32_t) {
+    group.Reset();
+    held += group.numBuckets * group.BlockSize();
+  });
+  BudgetOf(*this).held = held;
   return true;
 }
 
 void BucketMgr::ReleaseExtRecs() noexcept {
   for (ExtRec* e = extRecs; e != nullptr;) {
     ExtRec* const next = e->next;
-    BudgetOf(*this).Remove(sizeof(ExtRec) + std::uint64_t{e->length});
     ExtRec::Destroy(e);
     e = next;
   }

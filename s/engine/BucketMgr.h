@@ -5,7 +5,6 @@
 #define VOK_MEMPOOL_BUCKETMGR_H
 
 #include "engine/SizeClasses.h"
-#include "services/Settings.h"
 
 #include <cstddef>
 #include <cstdint>
@@ -19,6 +18,7 @@ struct ExtRec;
 struct Group;
 struct SizeFreqMap;
 class Mgr;
+struct Options;
 
 /// Sizes named `...RecSize` are whole records: the data and the 4 bytes of the header.
 ///
@@ -32,11 +32,11 @@ class Mgr;
 /// It opens with what names the pool, and closes with what the fast path reads beside the table:
 /// the two switches, and the fast index, which needs exactly the bytes they leave.
 struct BucketMgr {
-  std::string name;            ///< the pool's name, also its key in the registry
-  Mgr* mgr;                    ///< the public handle; the engine doesn't read it
-  Group** groups;              ///< one entry a size class, null until its first request
-  ExtRec* extRecs;             ///< head of the list of ExtRecs, null when there is none
-  std::uint32_t numGroups;     ///< length of `groups`
+  std::string name;        ///< the pool's name, also its key in the registry
+  Mgr* mgr;                ///< the public handle, which the engine passes to the program at a limit
+  Group** groups;          ///< one entry a size class, null until its first request
+  ExtRec* extRecs;         ///< head of the list of ExtRecs, null when there is none
+  std::uint32_t numGroups; ///< length of `groups`
   std::uint32_t numExtRecs;    ///< length of the list of ExtRecs
   std::uint32_t bucketSize;    ///< the most bytes of a bucket's record area
   std::uint32_t dataAlignment; ///< the multiple to which sizes are rounded, never 0
@@ -46,9 +46,9 @@ struct BucketMgr {
   bool enabled;                ///< the pool pools; false: every request goes to the heap
   FastIndex fastIndex;         ///< derived from the sizes: from a size to its index
 
-  /// Makes the table under these settings. Ends the process if they make a pool impossible; throws
-  /// what `operator new[]` throws.
-  BucketMgr(Mgr* mgr, const std::string& name, const Settings::Snapshot& settings);
+  /// Takes the snapshot of the settings, with the options over them, and makes the table. Ends the
+  /// process if they make a pool impossible; throws what `operator new[]` throws.
+  BucketMgr(Mgr* mgr, const std::string& name, const Options& options);
 
   /// Releases everything, used or not.
   ~BucketMgr();

@@ -20,43 +20,46 @@ struct Bucket;
 struct Budget {
   std::uint64_t held = 0;                       ///< bytes
   std::uint64_t peak = 0;                       ///< the most that it ever was
+  std::uint64_t reserved = 0;                   ///< bytes of blocks that are about to come
   std::uint64_t limit = UINT64_MAX;             ///< a request that would pass it fails
   decltype(Options::atLimit) atLimit = nullptr; ///< asked before such a request fails
   void* context = nullptr;                      ///< the last argument of atLimit
   const Bucket* newest = nullptr;               ///< the bucket made last, which may be gone
 
-  bool Admits(std::uint64_t bytes) const { return bytes <= limit && held <= limit - bytes; }
+  bool Admits(std::uint64_t bytes) const { return held + reserved + bytes <= limit; }
 
-  /// Asks the program for room; throws std::bad_alloc unless it answers that there may be some.
-  void AskFor(std::uint64_t bytes, Mgr& mgr) {
-    if (atLimit == nullptr || !atLimit(mgr, static_cast<std::size_t>(bytes), context))
+  /// Asks the program for room; throws std::bad_alloc unless it answers that there may be some, and
+  /// for a block that fits into no room.
+  void AskFor(std::uint64_t bytes, Mgr& mgr) const {
+    if (bytes > limit || atLimit == nullptr ||
+        !atLimit(mgr, static_cast<std::size_t>(bytes), context))
       throw std::bad_alloc();
   }
 
-  /// Room for a block that is about to come from the heap. It counts at once, so that what a
-  /// new-handler allocates meanwhile can't pass the limit; no longer, if no block comes.
+  /// The length of a damaged ExtRec may be more than all that is held.
+  void Remove(std::uint64_t bytes) { held -= std::min(held, bytes); }
+
+  /// Room for a block that is about to come from the heap, so that what a new-handler allocates
+  /// meanwhile can't pass the limit.
   class Room {
   public:
     Room(Budget& budget_, std::uint64_t bytes_) : budget(budget_), bytes(bytes_) {
-      budget.held += bytes;
+      budget.reserved += bytes;
     }
-    ~Room() { budget.Remove(bytes); }
+    ~Room() { budget.reserved -= bytes; }
     Room(const Room&) = delete;
     Room& operator=(const Room&) = delete;
 
     /// The block is there.
     void Fill() {
+      budget.held += bytes;
       budget.peak = std::max(budget.peak, budget.held);
-      bytes = 0;
     }
 
   private:
     Budget& budget;
-    std::uint64_t bytes;
+    const std::uint64_t bytes;
   };
-
-  /// The length of a damaged ExtRec may be more than all that is held.
-  void Remove(std::uint64_t bytes) { held -= std::min(held, bytes); }
 };
 
 /// The block that a pool lives in.
@@ -64,8 +67,7 @@ struct PoolBlock {
   BucketMgr pool;
   Budget budget;
 
-  PoolBlock(Mgr* mgr, const std::string& name, const Settings::Snapshot& settings)
-      : pool(mgr, name, settings) {}
+  PoolBlock(Mgr* mgr, const std::string& name, const Options& options) : pool(mgr, name, options) {}
 
   static PoolBlock& Of(BucketMgr& pool) { return reinterpret_cast<PoolBlock&>(pool); }
   static const PoolBlock& Of(const BucketMgr& pool) {

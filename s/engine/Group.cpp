@@ -82,7 +82,6 @@ void Group::Clear() noexcept {
     Bucket::Destroy(b);
     b = next;
   }
-  BudgetOf(*owner).Remove(numBuckets * BlockSize());
   head1 = head2 = nullptr;
   numBuckets = numFreeBuckets = 0;
 }

@@ -9,7 +9,6 @@
 #include "engine/Invariants.h"
 #include "services/Messages.h"
 #include "services/MgrRegistry.h"
-#include "services/Settings.h"
 
 #include <cstdint>
 #include <memory>
@@ -38,7 +37,7 @@ Mgr::Mgr() : Mgr(nullptr) {}
 Mgr::Mgr(const char* name) : bucketMgr(nullptr) {
   const std::string text = name != nullptr ? name : MgrRegistry::NextAutomaticName();
   if (MgrRegistry::Contains(text)) StopDuplicate(text);
-  auto block = std::make_unique<PoolBlock>(this, text, Settings::Now());
+  auto block = std::make_unique<PoolBlock>(this, text, Options());
   bucketMgr = &block->pool;
   if (!MgrRegistry::Enter(text, bucketMgr)) StopDuplicate(text);
   static_cast<void>(block.release());
@@ -82,10 +81,7 @@ bool Mgr::Reset() {
   return bucketMgr->Reset();
 }
 
-void* Mgr::AllocWide(unsigned long long size) {
-  if (size > maxRequest) StopTooLarge(size);
-  return Alloc(static_cast<unsigned>(size));
-}
+void* Mgr::AllocWide(unsigned long long size) { StopTooLarge(size); }
 
 unsigned Mgr::GetSize(const void* p) const { return bucketMgr->GetSize(p); }
 

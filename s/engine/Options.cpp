@@ -16,15 +16,6 @@ namespace VOK::MemPool {
 
 namespace {
 
-Settings::Snapshot Over(Settings::Snapshot settings, const Options& options) {
-  return {options.bucketSize.Or(settings.bucketSize),
-          options.dataAlignment.Or(settings.dataAlignment),
-          options.maxRecordSize.Or(settings.maxRecordSize),
-          options.minRecordSize.Or(settings.minRecordSize),
-          options.keepEmptyBuckets.Or(settings.keepEmptyBuckets),
-          options.on.Or(settings.on)};
-}
-
 [[noreturn]] void Refuse(const std::string& why) { throw std::invalid_argument(why); }
 
 [[noreturn]] void RefuseName(const std::string& name) {
@@ -38,35 +29,37 @@ std::string Sum(const char* name, std::uint64_t size, std::uint64_t more, const 
          std::to_string(bound) + ')';
 }
 
-void Test(const Settings::Snapshot& settings, const Options& options) {
-  if (settings.dataAlignment > maxDataAlignment)
-    Refuse(Sum("the data alignment is no number of 16 bits", settings.dataAlignment, 0, ">",
-               maxDataAlignment));
-  const std::uint32_t bucketSize = std::min(settings.bucketSize, maxBucketSize);
-  const RecSizeRange range = Normalise(settings.minRecordSize, settings.maxRecordSize,
-                                       std::max(settings.dataAlignment, 1u));
+void Test(const Options& options) {
+  const std::uint32_t alignment = options.dataAlignment.Or(Settings::dataAlignment);
+  if (alignment > maxDataAlignment)
+    Refuse(Sum("the data alignment is no number of 16 bits", alignment, 0, ">", maxDataAlignment));
+  const std::uint32_t bucketSize =
+      std::min(options.bucketSize.Or(Settings::bucketSize), maxBucketSize);
+  const RecSizeRange range =
+      Normalise(options.minRecordSize.Or(Settings::minRecordSize),
+                options.maxRecordSize.Or(Settings::maxRecordSize), std::max(alignment, 1u));
   if (range.max + recHeaderSize > bucketSize)
     Refuse(Sum("the largest record and its header don't fit into a bucket", range.max,
                recHeaderSize, ">", bucketSize));
   if (range.min > range.max)
     Refuse(Sum("the smallest record is larger than the largest", range.min, 0, ">", range.max));
-  if (options.limit != 0 && !settings.on)
+  if (options.limit != 0 && !options.on.Or(!Settings::off))
     Refuse("a limit needs pooling on: the blocks of the heap can't be counted");
 }
 
 } // namespace
 
 Mgr::Mgr(const char* name, const Options& options) : bucketMgr(nullptr) {
-  const Settings::Snapshot settings = Over(Settings::Now(), options);
-  Test(settings, options);
+  Test(options);
   const std::string text = name != nullptr ? name : MgrRegistry::NextAutomaticName();
   if (MgrRegistry::Contains(text)) RefuseName(text);
-  auto block = std::make_unique<PoolBlock>(this, text, settings);
+  auto block = std::make_unique<PoolBlock>(this, text, options);
   if (options.limit != 0) block->budget.limit = options.limit;
   block->budget.atLimit = options.atLimit;
   block->budget.context = options.context;
-  if (!MgrRegistry::Enter(text, &block->pool)) RefuseName(text);
-  bucketMgr = &block.release()->pool;
+  bucketMgr = &block->pool;
+  if (!MgrRegistry::Enter(text, bucketMgr)) RefuseName(text);
+  static_cast<void>(block.release());
 }
 
 } // namespace VOK::MemPool

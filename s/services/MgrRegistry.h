@@ -14,7 +14,7 @@ class Mgr;
 struct BucketMgr;
 
 /// Any thread may call these at any time. The lock is held for no allocation and no release, since
-/// a program's own heap and its new-handler may come back here.
+/// a program's own heap and its new-handler may come back here; it is held during a fork.
 namespace MgrRegistry {
 
 /// Constructs the map, empty. Called once, before anything else of the library.

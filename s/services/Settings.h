@@ -18,19 +18,6 @@ extern VOK_HIDDEN std::uint32_t minRecordSize;
 extern VOK_HIDDEN bool keepEmptyBuckets;
 extern VOK_HIDDEN bool off;
 
-/// What a pool copies when it is built.
-struct Snapshot {
-  std::uint32_t bucketSize;
-  std::uint32_t dataAlignment;
-  std::uint32_t maxRecordSize;
-  std::uint32_t minRecordSize;
-  bool keepEmptyBuckets;
-  bool on;
-};
-inline Snapshot Now() {
-  return {bucketSize, dataAlignment, maxRecordSize, minRecordSize, keepEmptyBuckets, !off};
-}
-
 /// Stores the defaults, reads the environment keys, writes the banner if a key asks for it, and
 /// refuses the load with an exception if the smallest record is not below the largest.
 /// Called once, while the library loads.
