@@ -67,7 +67,8 @@ void Exchange(const Options& options, unsigned numSteps) {
     std::mt19937 random(seed);
     for (unsigned i = 0; i < count; ++i) {
       ThreadPools& pools = random() % 8 == 0 ? two : one;
-      auto* const block = new Block(pools, random() % 2001, std::size_t{1} << random() % 9);
+      auto* const block =
+          new Block(pools, random() % 2001 >> random() % 9, std::size_t{1} << random() % 9);
       delete blocks[random() % blocks.size()].exchange(block);
     }
   };
@@ -105,7 +106,7 @@ TEST(ThreadPools, ServeEverySizeAndAlignment) {
       std::vector<std::unique_ptr<Block>> blocks;
       for (std::size_t size = 0; size <= 2000; size += VOK_MEMPOOL_EMULATED ? 7 : 1)
         blocks.push_back(std::make_unique<Block>(pools, size, alignment));
-      if (alignment % 16 == 0) InThread([&] { blocks.clear(); });
+      if (alignment % 3 == 1) InThread([&] { blocks.clear(); });
     }
     ExpectEmpty(pools, "sizes", 1);
     const std::size_t most = std::numeric_limits<std::size_t>::max();
@@ -136,12 +137,15 @@ TEST(ThreadPools, AreHandedOn) {
 }
 
 TEST(ThreadPools, TakeBackBeforeAnAllocationFails) {
-  ThreadPools pools("limited", Options().On().Limit(4000));
-  for (int i = 0; i < 3; ++i) {
-    void* const block = pools.Alloc(3000);
-    EXPECT_THROW(pools.Alloc(1000), std::bad_alloc);
-    InThread([&] { pools.Free(block); });
-  }
+  ThreadPools pools("limited", Options().On().Limit(20000));
+  for (const unsigned size : {100U, 3000U})
+    for (int round = 0; round < 3; ++round) {
+      std::vector<void*> blocks;
+      EXPECT_THROW(for (;;) blocks.push_back(pools.Alloc(size)), std::bad_alloc);
+      EXPECT_GE(blocks.size() * size, 12000U) << round;
+      InThread(
+          [&] { std::for_each(blocks.begin(), blocks.end(), [&](void* p) { pools.Free(p); }); });
+    }
   ExpectEmpty(pools, "limited", 1);
 }
 
