@@ -8,14 +8,17 @@
 //   clear/SIZE/COUNT         builds COUNT records and frees all of them at once
 //   reset/SIZE/COUNT         the same by Reset; an allocator without it frees each
 //   threads/COUNT            churn/2000 in COUNT threads, each with a pool of its own
+//   shared/handover/SIZE     one thread allocates, another one frees
+//   shared/exchange/LIVE     two threads replace LIVE records of realistic sizes, also each other's
+//   shared/larson/LIVE       two threads replace LIVE records each, which the next two take over
 //   replay/NAME TRACE        a recorded program, again and again in one process, its pool
 //                            constructed and destroyed each time
 //   fresh/NAME TRACE         the same, to be done once
 //   resident/SIZE            memory: a million records
 //   resident/NAME TRACE      memory: a recorded program at its peak
 // It writes "ready", and answers each "go N" with the nanoseconds of N runs and a checksum:
-// processor time, except for threads. A memory workload writes its answer at once: payload, grown,
-// left, checksum.
+// processor time, except for threads and shared. A memory workload writes its answer at once:
+// payload, grown, left, checksum.
 #ifndef VOK_BENCH_HARNESS_H
 #define VOK_BENCH_HARNESS_H
 
@@ -23,6 +26,7 @@
 #include "Records.h"
 #include "Replay.h"
 #include "Resident.h"
+#include "Shared.h"
 
 #include <cstdint>
 #include <cstdio>
@@ -81,9 +85,29 @@ private:
   std::vector<std::string> words;
 };
 
+template <class Allocator>
+concept ThreadSafe = Allocator::isThreadSafe;
+
+/// False if there is no such workload.
+template <ThreadSafe Allocator>
+bool RunShared(const Request& ask) {
+  if (ask.Text(1) == "handover")
+    Serve(Handover<Allocator>(ask.Number(2)), CLOCK_MONOTONIC);
+  else if (ask.Text(1) == "exchange")
+    Serve(Exchange<Allocator>(ask.Number(2)), CLOCK_MONOTONIC);
+  else if (ask.Text(1) == "larson")
+    Serve(Larson<Allocator>(ask.Number(2)), CLOCK_MONOTONIC);
+  else
+    return false;
+  return true;
+}
+
 /// False if there is no such workload.
 template <class Allocator>
 bool RunWorkload(const Request& ask) {
+  if constexpr (ThreadSafe<Allocator>) {
+    if (ask.Is("shared", 3)) return RunShared<Allocator>(ask);
+  }
   constexpr std::uint32_t live = 4000;
   constexpr std::uint32_t large = 20;
   if (ask.Is("lifo", 3))

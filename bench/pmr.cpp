@@ -2,4 +2,6 @@
 #include "Harness.h"
 #include "competitors/PmrPool.h"
 
-int main(int argc, char** argv) { return Bench::Main<Bench::PmrPool>(argc, argv); }
+int main(int argc, char** argv) {
+  return Bench::Main<Bench::PmrPool<std::pmr::unsynchronized_pool_resource>>(argc, argv);
+}

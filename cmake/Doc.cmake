@@ -20,6 +20,6 @@ set(DOXYGEN_JAVADOC_AUTOBRIEF YES)
 set(DOXYGEN_WARN_AS_ERROR FAIL_ON_WARNINGS)
 file(GLOB documents CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/docs/*.md)
 doxygen_add_docs(doc
-  include/MemPool include/MemPoolAllocator README.md ${documents}
+  include/MemPool include/MemPoolAllocator include/MemPoolThreads README.md ${documents}
   WORKING_DIRECTORY ${PROJECT_SOURCE_DIR}
   COMMENT "Writing the pages of the public headers")

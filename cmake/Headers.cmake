@@ -41,3 +41,4 @@ endfunction()
 
 vok_public_header(MemPool "VOK::vector<int>" 11 14 17 20)
 vok_public_header(MemPoolAllocator "VOK::MemPool::Allocator<int>" 17 20)
+vok_public_header(MemPoolThreads "VOK::MemPool::ThreadAllocator<int>" 17 20)

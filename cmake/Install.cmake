@@ -7,7 +7,7 @@ install(TARGETS VokMemPool EXPORT VokMemPoolTargets
   RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR} COMPONENT runtime
   LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT runtime NAMELINK_COMPONENT development
   ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT development)
-install(FILES include/MemPool include/MemPoolAllocator
+install(FILES include/MemPool include/MemPoolAllocator include/MemPoolThreads
   DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/VokMemPool COMPONENT development)
 
 write_basic_package_version_file(VokMemPoolConfigVersion.cmake COMPATIBILITY SameMajorVersion)

@@ -12,6 +12,7 @@ namespace Bench {
 class Heap {
 public:
   static constexpr std::size_t alignment = alignof(std::max_align_t);
+  static constexpr bool isThreadSafe = true;
 
   void* Alloc(std::uint32_t size) {
     void* const p = std::malloc(size);
