@@ -5,6 +5,7 @@
 #include "base/KeepStores.h"
 #include "engine/BucketMgr.h"
 #include "engine/Budget.h"
+#include "engine/Checks.h"
 #include "engine/FastPath.h"
 #include "engine/Invariants.h"
 #include "services/Messages.h"
@@ -38,7 +39,7 @@ Mgr::Mgr() : Mgr(nullptr) {}
 Mgr::Mgr(const char* name) : bucketMgr(nullptr) {
   const std::string text = name != nullptr ? name : MgrRegistry::NextAutomaticName();
   if (MgrRegistry::Contains(text)) StopDuplicate(text);
-  auto block = std::make_unique<PoolBlock>(this, text, Settings::Now());
+  auto block = std::make_unique<PoolBlock>(this, text, Settings::Now(), Options());
   bucketMgr = &block->pool;
   if (!MgrRegistry::Enter(text, bucketMgr)) StopDuplicate(text);
   static_cast<void>(block.release());
@@ -74,11 +75,13 @@ bool Mgr::Free(void* p) {
 
 void Mgr::Clear() {
   const Checked checked(bucketMgr);
+  if (Checks* const checks = ChecksOf(*bucketMgr)) return checks->Clear();
   bucketMgr->Clear();
 }
 
 bool Mgr::Reset() {
   const Checked checked(bucketMgr);
+  if (Checks* const checks = ChecksOf(*bucketMgr)) return checks->Reset();
   return bucketMgr->Reset();
 }
 
@@ -98,5 +101,10 @@ BucketMgr* Mgr::GetBucketMgr() const { return bucketMgr; }
 const char* Mgr::GetName() const { return bucketMgr->name.c_str(); }
 
 bool Mgr::IsEnabled() const { return bucketMgr->enabled; }
+
+unsigned Mgr::GetNumFindings() const {
+  const Checks* const checks = ChecksOf(*bucketMgr);
+  return checks != nullptr ? checks->GetNumFindings() : 0;
+}
 
 } // namespace VOK::MemPool

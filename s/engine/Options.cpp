@@ -22,7 +22,9 @@ Settings::Snapshot Over(Settings::Snapshot settings, const Options& options) {
           options.maxRecordSize.Or(settings.maxRecordSize),
           options.minRecordSize.Or(settings.minRecordSize),
           options.keepEmptyBuckets.Or(settings.keepEmptyBuckets),
-          options.on.Or(settings.on)};
+          options.on.Or(settings.on),
+          options.checked.Or(settings.checked),
+          options.endsAtFinding.Or(settings.endsAtFinding)};
 }
 
 [[noreturn]] void Refuse(const std::string& why) { throw std::invalid_argument(why); }
@@ -61,7 +63,7 @@ Mgr::Mgr(const char* name, const Options& options) : bucketMgr(nullptr) {
   Test(settings, options);
   const std::string text = name != nullptr ? name : MgrRegistry::NextAutomaticName();
   if (MgrRegistry::Contains(text)) RefuseName(text);
-  auto block = std::make_unique<PoolBlock>(this, text, settings);
+  auto block = std::make_unique<PoolBlock>(this, text, settings, options);
   if (options.limit != 0) block->budget.limit = options.limit;
   block->budget.atLimit = options.atLimit;
   block->budget.context = options.context;

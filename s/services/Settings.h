@@ -17,6 +17,8 @@ extern VOK_HIDDEN std::uint32_t maxRecordSize;
 extern VOK_HIDDEN std::uint32_t minRecordSize;
 extern VOK_HIDDEN bool keepEmptyBuckets;
 extern VOK_HIDDEN bool off;
+extern VOK_HIDDEN bool checked;       ///< set by an environment key alone, as is the next
+extern VOK_HIDDEN bool endsAtFinding; ///< a finding of a checked pool ends the process
 
 /// What a pool copies when it is built.
 struct Snapshot {
@@ -26,9 +28,12 @@ struct Snapshot {
   std::uint32_t minRecordSize;
   bool keepEmptyBuckets;
   bool on;
+  bool checked;
+  bool endsAtFinding;
 };
 inline Snapshot Now() {
-  return {bucketSize, dataAlignment, maxRecordSize, minRecordSize, keepEmptyBuckets, !off};
+  return {bucketSize,       dataAlignment, maxRecordSize, minRecordSize,
+          keepEmptyBuckets, !off,          checked,       endsAtFinding};
 }
 
 /// Stores the defaults, reads the environment keys, writes the banner if a key asks for it, and
