@@ -1,12 +1,13 @@
 #!/usr/bin/env bash
 # Runs an example by the command given as arguments, and compares what it prints with its golden
 # text, or writes that again if VOK_MEMPOOL_APPROVE is set. An address becomes a number, the same at
-# each place, and the sizes that go with the width of a pointer become an N.
+# each place, and source lines and the sizes that go with the width of a pointer become an N.
 set -uo pipefail
 golden=$(dirname "$0")/golden/examples/$(basename "${@: -1}" .exe).txt
 
 masked() {
   perl -pe 's/\r//; s/:([0-9a-f]{5,})/:0x$1/g if /^zvpt:/; s/0x[0-9a-f]+/$a{$&} ||= "A" . ++$n/ge;
+    s/^(WARNING:\S+:) *\d+:/$1    N:/;
     s/^( +Sizeof (Buck|    ) +: +)\d+$/$1N/'
 }
 

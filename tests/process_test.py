@@ -68,6 +68,18 @@ pool_host ON=1 TRACE=1 ZOR_STATIC_POOLS=1 : open client; pool a; close; open cli
     3 of 6: __VOK_MEMPOOL_00001 b client; zvpt:d:@5; zvpt:d:@4
 """
 
+# Checked pools: they say what they find, or end with it, at the pool's end too.
+CHECKED = """
+CHECK=1 ON=1 : pool a; alloc 10; free 0; free 0; alloc 8; free 1; drop
+    -> freed; WARNING 1: Pool 'a': second Free of 0x@, a record of 10 bytes, request 1; refused; freed
+CHECK=2|CHECK=+3x ON=1 : pool a; alloc 10; free 0; free 0 | names
+    -> freed; ERROR 2: Pool 'a': second Free of 0x@, a record of 10 bytes, request 1; 1 of 2: a; status 1
+CHECK=2 ON=1 : pool a; alloc 10; drop | names
+    -> ERROR 2: Pool 'a': still in use at the end: 0x@, a record of 10 bytes, request 1; 0 of 1:; status 1
+CHECK=0|CHECK=-1|CHECK=x ON=1 : pool a; alloc 10; drop | names -> 0 of 1:
+CHECK=2 ON=0 : pool a; alloc 10; drop | names -> 0 of 1:
+"""
+
 # The registry is destroyed first, and pools still serve. A failed load at run time throws its text,
 # and the library stays, with the settings as read. Each key is looked up once, in its order.
 ON_LINUX = """
@@ -77,9 +89,9 @@ pool_host ON=1 TRACE=1 ZOR_STATIC_POOLS=1 : open client; pool a | names; alloc 1
 pool_host MIN_RECORD_SIZE=1000 ON=1 TRACE=1 : grouping; open library; open client; nameless;
     alloc 10 -> EXCEPTION 1: (1000>=1000); zvpt:c:@1; zvpt:a:@1:@2:10; !EXCEPTION 1: (1000>=1000)
 ZOR_SHOW_KEYS=1 ON=0 : -> ON; ZOR_MEMPOOL_ON; TRACE; BUCKET_SIZE; MAX_RECORD_SIZE;
-    MIN_RECORD_SIZE; DATA_ALIGNMENT; KEEP_EMPTY_BUCKETS; INFO
+    MIN_RECORD_SIZE; DATA_ALIGNMENT; KEEP_EMPTY_BUCKETS; INFO; CHECK
 ZOR_SHOW_KEYS=1 ON=1 : -> ON; TRACE; BUCKET_SIZE; MAX_RECORD_SIZE; MIN_RECORD_SIZE; DATA_ALIGNMENT;
-    KEEP_EMPTY_BUCKETS; INFO
+    KEEP_EMPTY_BUCKETS; INFO; CHECK
 """
 
 # A program's handlers run ahead of any library's, and a load throws nothing to its caller.
@@ -127,6 +139,7 @@ memcheck|asan ON=1 : pool a; alloc 10; alloc 10; free 1; free 1; size 1; contain
 memcheck|asan ON=1 : pool a; alloc 12; alloc 12; free 0; write 0; alloc 12; write 16; drop -> freed
 memcheck|asan ON=1 : pool a; alloc 13; alloc 5000; report; free 0; free 1; alloc 996; clear;
     alloc 8; alloc 5000; reset; alloc 5000; drop -> ~ ^$
+memcheck|asan ON=1 CHECK=2 : pool a; alloc 13; alloc 5000; free 0; alloc 8; alloc 9; drop -> ~ ^$
 
 # How often the heap returns memory: never within the slack, once for a Clear or a pool beyond it.
 strace ON=1 : pool a; build 100; clear; build 1000; clear; build 10000; drop -> ~ ^0 shrinks
@@ -163,10 +176,11 @@ SHORT = {
     "Unexpected condition: the min rec size is larger than the max rec size ": "minimum ",
     "MIN_RECORD_SIZE >= MAX_RECORD_SIZE ": "",
     "(?m)^ZOR_VOK_MEMPOOL_": "",
+    "0x[0-9a-f]+": "0x@",
 }
 
 MESSAGE = re.compile(
-    r"^(?:(ERROR|INFO):\.\./s/MemPool:(?=.{5}:) *|(EXCEPTION):\.\./s/MemPool:)([1-9]\d*):", re.M)
+    r"^(?:(ERROR|WARNING|INFO):\.\./s/MemPool:(?=.{5}:) *|(EXCEPTION):\.\./s/MemPool:)([1-9]\d*):", re.M)
 TRACE = re.compile(r"^zvpt:(.):([0-9a-f]+)(?::([0-9a-f]+)(?=:\d*$))?", re.M)
 # What the language's runtime and the emulator say of an abort is not the library's.
 FOREIGN = re.compile(r"^(terminate called|qemu: uncaught).*\n", re.M)
@@ -177,6 +191,8 @@ PROGRAMS = pathlib.Path(sys.argv[1])
 OBSERVERS = sys.argv[2:] == ["--observers"]
 LAUNCHER = "" if OBSERVERS else " ".join(sys.argv[2:])
 WINDOWS = (PROGRAMS / "pool_child.exe").exists()
+# Under the address sanitizer no pool checks.
+CHECKS = WINDOWS or b"__asan_init" not in (PROGRAMS / "pool_child").read_bytes()
 
 
 def calls_in(text):
@@ -235,7 +251,7 @@ def masked(text, statements):
 
 
 def main():
-    text = FAULTS if OBSERVERS else CALLS + (ON_WINDOWS if WINDOWS else ON_LINUX)
+    text = FAULTS if OBSERVERS else CALLS + CHECKED * CHECKS + (ON_WINDOWS if WINDOWS else ON_LINUX)
     calls = list(calls_in(text))
     statements = collections.defaultdict(lambda: collections.defaultdict(itertools.count(1).__next__))
     failures = []

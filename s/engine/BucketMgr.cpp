@@ -6,6 +6,7 @@
 #include "base/KeepStores.h"
 #include "engine/Bucket.h"
 #include "engine/Budget.h"
+#include "engine/Checks.h"
 #include "engine/ExtRec.h"
 #include "engine/FastPath.h"
 #include "engine/Group.h"
@@ -42,7 +43,7 @@ BucketMgr::BucketMgr(Mgr* mgr_, const std::string& name_, const Options& options
   maxRecSize = static_cast<std::uint32_t>(range.max);
   minRecSize = static_cast<std::uint32_t>(range.min);
   numGroups = (maxRecSize - minRecSize) / dataAlignment + 1;
-  fastIndex = MakeFastIndex(minRecSize, maxRecSize, dataAlignment);
+  fastIndex = enabled ? MakeFastIndex(minRecSize, maxRecSize, dataAlignment) : noFastIndex;
   groups = new Group* [numGroups] {};
   if (enabled) HeapTop::KeepSlack();
 }
@@ -58,6 +59,11 @@ BucketMgr::~BucketMgr() {
 
 VOK_NOINLINE void* BucketMgr::AllocSlow(std::uint32_t size) {
   if (!enabled) return ::operator new[](size);
+  if (Checks* const checks = ChecksOf(*this)) return checks->Alloc(size);
+  return AllocPooled(size);
+}
+
+void* BucketMgr::AllocPooled(std::uint32_t size) {
   const std::uint32_t dataSize = RoundUp(size, dataAlignment);
   if (dataSize + recHeaderSize > maxRecSize) return AllocExtRec(size);
   return GroupFor(dataSize)->Alloc();
@@ -80,6 +86,11 @@ VOK_NOINLINE bool BucketMgr::FreeSlow(void* p) {
     ::operator delete[](p);
     return true;
   }
+  if (Checks* const checks = ChecksOf(*this)) return checks->Free(p);
+  return FreePooled(p);
+}
+
+bool BucketMgr::FreePooled(void* p) {
   if (Bucket* const bucket = FindBucket(p)) return bucket->parent->Free(p, bucket);
   ExtRec* const e = FindExtRec(p);
   if (e == nullptr) return false;
@@ -129,6 +140,7 @@ Group* BucketMgr::GroupFor(std::uint32_t dataSize) {
 }
 
 std::uint32_t BucketMgr::GetSize(const void* p) const {
+  if (const Checks* const checks = ChecksOf(*this)) return checks->GetSize(p);
   const Observers::Quiet quiet;
   if (const Bucket* const bucket = FindBucket(p)) return bucket->recSize - recHeaderSize;
   if (const ExtRec* const e = ExtRec::FromData(p)) return e->length;
@@ -136,6 +148,7 @@ std::uint32_t BucketMgr::GetSize(const void* p) const {
 }
 
 bool BucketMgr::Contains(const void* p) const {
+  if (const Checks* const checks = ChecksOf(*this)) return checks->Contains(p);
   const Observers::Quiet quiet;
   return FindBucket(p) != nullptr || ExtRec::FromData(p) != nullptr;
 }

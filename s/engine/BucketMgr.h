@@ -44,7 +44,7 @@ struct BucketMgr {
   std::uint32_t minRecSize;    ///< record size at index 0, to which smaller ones are clamped up
   bool keepEmptyBuckets;       ///< an emptied bucket stays
   bool enabled;                ///< the pool pools; false: every request goes to the heap
-  FastIndex fastIndex;         ///< derived from the sizes: from a size to its index
+  FastIndex fastIndex;         ///< from a size to its index: derived from the sizes, or noFastIndex
 
   /// Takes the snapshot of the settings, with the options over them, and makes the table. Ends the
   /// process if they make a pool impossible; throws what `operator new[]` throws.
@@ -62,6 +62,10 @@ struct BucketMgr {
 
   /// Takes back `p`; false, with nothing changed, if it isn't recognised as this pool's.
   bool Free(void* p);
+
+  /// Alloc and Free of an enabled pool by the general mapping, past the checks of a checked pool.
+  void* AllocPooled(std::uint32_t size);
+  bool FreePooled(void* p);
 
   /// Releases all records and size classes; the table, the name and the snapshot stay.
   void Clear() noexcept;

@@ -1,16 +1,21 @@
-// What a pool holds of the heap: its count, its peak, its limit. It is defined beside the
-// BucketMgr, in one block with it, since that one's layout is fixed. No request on the fast path
-// touches it. Test: tests/options_test.cpp.
+// What a pool holds of the heap: its count, its peak, its limit; and the block of a pool. What that
+// has beside the BucketMgr, whose layout is fixed, no request on the fast path touches.
+// Test: tests/options_test.cpp.
 #ifndef VOK_MEMPOOL_BUDGET_H
 #define VOK_MEMPOOL_BUDGET_H
 
 #include "MemPool"
 #include "engine/BucketMgr.h"
+#include "engine/Checks.h"
+#include "services/Observers.h"
+#include "services/Settings.h"
 
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>
+#include <memory>
 #include <new>
+#include <string>
 
 namespace VOK::MemPool {
 
@@ -66,8 +71,15 @@ struct Budget {
 struct PoolBlock {
   BucketMgr pool;
   Budget budget;
+  std::unique_ptr<Checks> checks; ///< of a checked pool; ends before the pool
 
-  PoolBlock(Mgr* mgr, const std::string& name, const Options& options) : pool(mgr, name, options) {}
+  /// Where a memory-checking tool is present, that one checks.
+  PoolBlock(Mgr* mgr, const std::string& name, const Options& options) : pool(mgr, name, options) {
+    if (!pool.enabled || !options.checked.Or(Settings::checked) || Observers::Present()) return;
+    pool.fastIndex = noFastIndex;
+    checks =
+        std::make_unique<Checks>(pool, options.endsAtFinding.Or(Settings::endsAtFinding), options);
+  }
 
   static PoolBlock& Of(BucketMgr& pool) { return reinterpret_cast<PoolBlock&>(pool); }
   static const PoolBlock& Of(const BucketMgr& pool) {
@@ -79,6 +91,9 @@ static_assert(offsetof(PoolBlock, pool) == 0);
 
 inline Budget& BudgetOf(BucketMgr& pool) { return PoolBlock::Of(pool).budget; }
 inline const Budget& BudgetOf(const BucketMgr& pool) { return PoolBlock::Of(pool).budget; }
+
+/// Null for a pool that isn't checked.
+inline Checks* ChecksOf(const BucketMgr& pool) { return PoolBlock::Of(pool).checks.get(); }
 
 } // namespace VOK::MemPool
 

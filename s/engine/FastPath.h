@@ -22,7 +22,7 @@ VOK_ALWAYS_INLINE Group* BucketMgr::FastGroup(std::uint32_t size) const {
   return index < numGroups ? groups[index] : nullptr;
 }
 
-// A disabled pool needs no test here: all entries of its table are null.
+// A pool with noFastIndex, as a disabled or a checked one, needs no test here: it finds no Group.
 VOK_ALWAYS_INLINE void* BucketMgr::Alloc(std::uint32_t size) {
   assert(size <= maxRequest);
   if (Observers::Watching()) [[unlikely]]
@@ -45,7 +45,8 @@ VOK_ALWAYS_INLINE bool BucketMgr::Free(void* p) {
     return FreeLowAddress(p);
   if (Observers::Watching()) [[unlikely]]
     return FreeInstrumented(p);
-  if (!enabled) [[unlikely]]
+  // Such a pool reads nothing before the pointer: the bytes can be the heap's, or nobody's.
+  if (fastIndex.shift == noFastIndex.shift) [[unlikely]]
     return FreeSlow(p);
   const Rec* const rec = Rec::FromData(p);
   if (rec->type != RecType::Used || rec->Offset() < 2) [[unlikely]]

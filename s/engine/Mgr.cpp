@@ -5,6 +5,7 @@
 #include "base/KeepStores.h"
 #include "engine/BucketMgr.h"
 #include "engine/Budget.h"
+#include "engine/Checks.h"
 #include "engine/FastPath.h"
 #include "engine/Invariants.h"
 #include "services/Messages.h"
@@ -73,11 +74,13 @@ bool Mgr::Free(void* p) {
 
 void Mgr::Clear() {
   const Checked checked(bucketMgr);
+  if (Checks* const checks = ChecksOf(*bucketMgr)) return checks->Clear();
   bucketMgr->Clear();
 }
 
 bool Mgr::Reset() {
   const Checked checked(bucketMgr);
+  if (Checks* const checks = ChecksOf(*bucketMgr)) return checks->Reset();
   return bucketMgr->Reset();
 }
 
@@ -94,5 +97,10 @@ BucketMgr* Mgr::GetBucketMgr() const { return bucketMgr; }
 const char* Mgr::GetName() const { return bucketMgr->name.c_str(); }
 
 bool Mgr::IsEnabled() const { return bucketMgr->enabled; }
+
+unsigned Mgr::GetNumFindings() const {
+  const Checks* const checks = ChecksOf(*bucketMgr);
+  return checks != nullptr ? checks->GetNumFindings() : 0;
+}
 
 } // namespace VOK::MemPool

@@ -68,15 +68,22 @@ std::vector<SizeClass> Mgr::GetSizeClasses() const {
 // Memcheck still reports errors in the program's function.
 void Mgr::VisitRecords(void (*visit)(void* context, void* data, unsigned size),
                        void* context) const {
+  const auto show = [&](void* data, std::uint32_t size) {
+    const Checks* const checks = ChecksOf(*bucketMgr);
+    if (checks == nullptr)
+      visit(context, data, size);
+    else if (checks->Contains(data))
+      visit(context, data, checks->GetSize(data));
+  };
   ForEachGroup(*bucketMgr, [&](const Group& group, std::uint32_t) {
     const std::uint32_t stride = group.dataSize + recHeaderSize;
     for (Bucket* b = group.head1; b != nullptr; b = b->next1)
       for (std::uint32_t i = 0; i < group.totalRecs; ++i)
         if (Rec* const rec = b->RecAt(2 + i * stride); Quietly(rec->type) == RecType::Used)
-          visit(context, rec->Data(), group.dataSize);
+          show(rec->Data(), group.dataSize);
   });
   for (ExtRec* e = bucketMgr->extRecs; e != nullptr; e = e->next)
-    visit(context, e->Data(), Quietly(e->length));
+    show(e->Data(), Quietly(e->length));
 }
 
 } // namespace VOK::MemPool

@@ -19,6 +19,8 @@ std::uint32_t maxRecordSize;
 std::uint32_t minRecordSize;
 bool keepEmptyBuckets;
 bool off;
+bool checked;
+bool endsAtFinding;
 
 namespace {
 
@@ -53,6 +55,7 @@ constexpr Setting settings[] = {
     {"ZOR_VOK_MEMPOOL_KEEP_EMPTY_BUCKETS", 0, Any, [](int n) { keepEmptyBuckets = n > 0; }},
     {"ZOR_VOK_MEMPOOL_INFO", -1, [](int n) { return n >= 0; },
      [](int n) { bannerWanted = n >= 0; }},
+    {"ZOR_VOK_MEMPOOL_CHECK", 0, IsPositive, [](int n) { checked = n > 0, endsAtFinding = n > 1; }},
 };
 
 /// Stores the number of an environment key; false if there is none that counts.

@@ -17,6 +17,8 @@ extern VOK_HIDDEN std::uint32_t maxRecordSize;
 extern VOK_HIDDEN std::uint32_t minRecordSize;
 extern VOK_HIDDEN bool keepEmptyBuckets;
 extern VOK_HIDDEN bool off;
+extern VOK_HIDDEN bool checked;       ///< set by an environment key alone, as is the next
+extern VOK_HIDDEN bool endsAtFinding; ///< a finding of a checked pool ends the process
 
 /// Stores the defaults, reads the environment keys, writes the banner if a key asks for it, and
 /// refuses the load with an exception if the smallest record is not below the largest.
