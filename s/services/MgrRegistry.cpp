@@ -20,14 +20,17 @@ namespace VOK::MemPool::MgrRegistry {
 namespace {
 
 using Map = std::map<std::string, BucketMgr*, std::less<>>;
-
-// The map's storage without its life: it begins by Begin and is never destroyed.
-alignas(Map) std::byte storage[sizeof(Map)];
-
-Map& Registry() { return *std::launder(reinterpret_cast<Map*>(storage)); }
-
-std::mutex mutex;
 using Lock = std::lock_guard<std::mutex>;
+
+struct Registry {
+  std::mutex mutex;
+  Map pools; // by name
+};
+
+// Storage without a life: it begins by Begin and is never destroyed.
+alignas(Registry) std::byte storage[sizeof(Registry)];
+
+Registry& Shared() { return *std::launder(reinterpret_cast<Registry*>(storage)); }
 
 std::atomic<std::uint32_t> nextMgrId = 1;
 
@@ -36,32 +39,33 @@ std::atomic<std::uint32_t> nextMgrId = 1;
 // A child process has the one thread that forked. If another one held the lock in that moment,
 // nobody would release it there: so the fork waits for it.
 void Begin() {
-  new (storage) Map;
+  new (storage) Registry;
 #ifdef __unix__
-  pthread_atfork([] { mutex.lock(); }, [] { mutex.unlock(); }, [] { mutex.unlock(); });
+  pthread_atfork([] { Shared().mutex.lock(); }, [] { Shared().mutex.unlock(); },
+                 [] { Shared().mutex.unlock(); });
 #endif
 }
 
 void End() noexcept {
   Map left;
-  const Lock lock(mutex);
-  left.swap(Registry());
+  const Lock lock(Shared().mutex);
+  left.swap(Shared().pools);
 }
 
 bool Contains(std::string_view name) {
-  const Lock lock(mutex);
-  return Registry().find(name) != Registry().end();
+  const Lock lock(Shared().mutex);
+  return Shared().pools.find(name) != Shared().pools.end();
 }
 
 Mgr* Find(std::string_view name) {
-  const Lock lock(mutex);
-  const auto entry = Registry().find(name);
-  return entry != Registry().end() ? HandleOf(entry->second) : nullptr;
+  const Lock lock(Shared().mutex);
+  const auto entry = Shared().pools.find(name);
+  return entry != Shared().pools.end() ? HandleOf(entry->second) : nullptr;
 }
 
 unsigned Count() {
-  const Lock lock(mutex);
-  return static_cast<unsigned>(Registry().size());
+  const Lock lock(Shared().mutex);
+  return static_cast<unsigned>(Shared().pools.size());
 }
 
 // Other threads may make pools between the reservation and the lock.
@@ -69,9 +73,9 @@ std::vector<Mgr*> Handles() {
   std::vector<Mgr*> handles;
   while (true) {
     handles.reserve(Count());
-    const Lock lock(mutex);
-    if (Registry().size() > handles.capacity()) continue;
-    for (const auto& [name, pool] : Registry())
+    const Lock lock(Shared().mutex);
+    if (Shared().pools.size() > handles.capacity()) continue;
+    for (const auto& [name, pool] : Shared().pools)
       handles.push_back(HandleOf(pool));
     return handles;
   }
@@ -80,16 +84,16 @@ std::vector<Mgr*> Handles() {
 bool Enter(const std::string& name, BucketMgr* pool) {
   Map made;
   made.emplace(name, pool);
-  const Lock lock(mutex);
-  Registry().merge(made);
+  const Lock lock(Shared().mutex);
+  Shared().pools.merge(made);
   return made.empty();
 }
 
 void Remove(std::string_view name) noexcept {
   Map::node_type gone;
-  const Lock lock(mutex);
-  const auto entry = Registry().find(name);
-  if (entry != Registry().end()) gone = Registry().extract(entry);
+  const Lock lock(Shared().mutex);
+  const auto entry = Shared().pools.find(name);
+  if (entry != Shared().pools.end()) gone = Shared().pools.extract(entry);
 }
 
 std::string NextAutomaticName() {
