@@ -30,6 +30,7 @@ struct Budget {
   decltype(Options::atLimit) atLimit = nullptr; ///< asked before such a request fails
   void* context = nullptr;                      ///< the last argument of atLimit
   const Bucket* newest = nullptr;               ///< the bucket made last, which may be gone
+  std::unique_ptr<Checks> checks;               ///< of a checked pool; ends before the pool
 
   bool Admits(std::uint64_t bytes) const { return held + reserved + bytes <= limit; }
 
@@ -71,13 +72,12 @@ struct Budget {
 struct PoolBlock {
   BucketMgr pool;
   Budget budget;
-  std::unique_ptr<Checks> checks; ///< of a checked pool; ends before the pool
 
   /// Where a memory-checking tool is present, that one checks.
   PoolBlock(Mgr* mgr, const std::string& name, const Options& options) : pool(mgr, name, options) {
     if (!pool.enabled || !options.checked.Or(Settings::checked) || Observers::Present()) return;
     pool.fastIndex = noFastIndex;
-    checks =
+    budget.checks =
         std::make_unique<Checks>(pool, options.endsAtFinding.Or(Settings::endsAtFinding), options);
   }
 
@@ -93,7 +93,7 @@ inline Budget& BudgetOf(BucketMgr& pool) { return PoolBlock::Of(pool).budget; }
 inline const Budget& BudgetOf(const BucketMgr& pool) { return PoolBlock::Of(pool).budget; }
 
 /// Null for a pool that isn't checked.
-inline Checks* ChecksOf(const BucketMgr& pool) { return PoolBlock::Of(pool).checks.get(); }
+inline Checks* ChecksOf(const BucketMgr& pool) { return BudgetOf(pool).checks.get(); }
 
 } // namespace VOK::MemPool
 
