@@ -75,7 +75,8 @@ void VisitLines(B& bucket, Visitor& visitor) {
 
 // The rows. A separator follows a Cell, but not a LastCell.
 
-template <Is<SizeRow> Row, class Visitor>
+template <class Row, class Visitor>
+requires Is<Row, SizeRow> || Is<Row, BucketSizeRow>
 void VisitCells(Row& row, Visitor& visitor) {
   visitor.Cell("id", row.id);
   visitor.Cell("size", row.size);
@@ -126,14 +127,6 @@ void VisitCells(Row& row, Visitor& visitor) {
   visitor.Cell("end", row.end);
   visitor.Cell("dataSize", row.dataSize);
   visitor.Cell("addr", row.addr);
-}
-
-template <Is<BucketSizeRow> Row, class Visitor>
-void VisitCells(Row& row, Visitor& visitor) {
-  visitor.Cell("id", row.id);
-  visitor.Cell("size", row.size);
-  visitor.Cell("freq", row.freq);
-  visitor.LastCell("bar", row.bar);
 }
 
 template <Is<FreeRow> Row, class Visitor>
