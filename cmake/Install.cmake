@@ -22,6 +22,7 @@ install(FILES ${CMAKE_CURRENT_BINARY_DIR}/VokMemPoolConfigVersion.cmake
 # The pages of section 3, and the function by which each setting is looked up as a link to one.
 install(FILES
   docs/man/MemPoolAllocator.3
+  docs/man/MemPoolThreads.3
   docs/man/VOK_MemPool.3
   docs/man/VOK_MemPool_Mgr.3
   DESTINATION ${CMAKE_INSTALL_MANDIR}/man3 COMPONENT development)

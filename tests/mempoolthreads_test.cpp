@@ -136,6 +136,40 @@ TEST(ThreadPools, AreHandedOn) {
   ExpectEmpty(pools, "handed on", 1);
 }
 
+// A tool that watches takes the cache and the checks away.
+bool IsWatched() { return Mgr().IsObserved(); }
+
+TEST(ThreadPools, KeepBlocksForTheirOwner) {
+  if (IsWatched()) return;
+  ThreadPools pools("kept", Options().On());
+  const Mgr& pool = *GetMgr("kept#1");
+  std::vector<void*> blocks;
+  for (int i = 0; i < 3000; ++i)
+    blocks.push_back(pools.Alloc(61U + static_cast<unsigned>(i) % 4, 8));
+  std::for_each(blocks.begin(), blocks.end(), [&](void* p) { pools.Free(p); });
+  EXPECT_EQ(pool.GetStats().usedRecords, 512U); // 32 KiB of 64 bytes
+  EXPECT_EQ(pools.Alloc(64, 8), blocks[511]);
+  pools.Free(blocks[511]);
+  EXPECT_NE(pools.Alloc(65, 8), blocks[511]);
+  pools.Collect();
+  EXPECT_EQ(pool.GetStats().usedRecords, 1U);
+}
+
+TEST(ThreadPools, HideNoFreeFromChecks) {
+  if (IsWatched()) return;
+  std::vector<Finding::Kind> kinds;
+  const auto note = [](Mgr&, const Finding& finding, void* context) {
+    static_cast<std::vector<Finding::Kind>*>(context)->push_back(finding.kind);
+  };
+  std::optional<ThreadPools> pools;
+  pools.emplace("checked", Options().On().Checked().AtFinding(note, &kinds));
+  auto* const block = static_cast<unsigned char*>(pools->Alloc(20));
+  pools->Free(block);
+  block[10] = 1;
+  pools.reset();
+  EXPECT_EQ(kinds, std::vector{Finding::Kind::WriteAfterFree});
+}
+
 TEST(ThreadPools, TakeBackBeforeAnAllocationFails) {
   ThreadPools pools("limited", Options().On().Limit(20000));
   for (const unsigned size : {100U, 3000U})

@@ -98,6 +98,8 @@ const char* Mgr::GetName() const { return bucketMgr->name.c_str(); }
 
 bool Mgr::IsEnabled() const { return bucketMgr->enabled; }
 
+bool Mgr::IsObserved() const { return Observers::Watching() || ChecksOf(*bucketMgr) != nullptr; }
+
 unsigned Mgr::GetNumFindings() const {
   const Checks* const checks = ChecksOf(*bucketMgr);
   return checks != nullptr ? checks->GetNumFindings() : 0;
