@@ -20,4 +20,5 @@ int main() {
   // The first lines are a summary: 9 records are used in 4 buckets, and 1 block is large. HISTOGRAM
   // shows the sizes in use, BUCKETS how full each bucket is, FREE BUCKETS which one serves next.
   pool.Dbg();
+  pool.Clear();
 }

@@ -12,8 +12,10 @@ int main() {
   void* small = pool.Alloc(10);
   void* large = pool.Alloc(2000);
   pool.Alloc(0);
-  other.Free(small); // false: not its record
+  void* theirs = other.Alloc(10);
   pool.Free(small);
+  other.Free(theirs);
   pool.Free(large);
   pool.Free(nullptr); // no line
+  pool.Clear();       // no line
 }

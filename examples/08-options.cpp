@@ -39,6 +39,7 @@ int main() {
   std::size_t bytes = 0;
   ForEachRecord(nodes, [&](void*, unsigned size) { bytes += size; });
   std::cout << "visited: " << bytes << " bytes\n";
+  nodes.Clear();
 
   try {
     const Mgr impossible("impossible", Options().On().BucketSize(500));

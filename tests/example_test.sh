@@ -1,7 +1,8 @@
 #!/usr/bin/env bash
 # Runs an example by the command given as arguments, and compares what it prints with its golden
 # text, or writes that again if VOK_MEMPOOL_APPROVE is set. An address becomes a number, the same at
-# each place, and source lines and the sizes that go with the width of a pointer become an N.
+# each place, and source lines and the sizes that go with the width of a pointer become an N. With
+# its pools checked, an example has no fault but the one that plants some.
 set -uo pipefail
 golden=$(dirname "$0")/golden/examples/$(basename "${@: -1}" .exe).txt
 
@@ -14,5 +15,9 @@ masked() {
 if [ -n "${VOK_MEMPOOL_APPROVE-}" ]; then
   "$@" | masked >"$golden"
 else
-  "$@" | masked | diff -u "$golden" -
+  "$@" | masked | diff -u "$golden" - || exit
+  case $golden in
+  */10-checked.txt) ;;
+  *) ! ZOR_VOK_MEMPOOL_CHECK=1 "$@" | grep '^WARNING' ;;
+  esac
 fi
