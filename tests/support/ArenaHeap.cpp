@@ -26,8 +26,12 @@
 
 namespace {
 
+#ifdef VOK_MEMPOOL_LOW_ARENA
+constexpr std::uintptr_t arenaPlace = 0x20000000;
+#else
 constexpr std::uintptr_t arenaPlace =
     static_cast<std::uintptr_t>(sizeof(void*) == 8 ? 0x200000000000 : 0x20000000);
+#endif
 constexpr std::size_t arenaSize = 256u << 20;
 constexpr std::size_t guard = 16; // before each block and after the last
 

@@ -1,6 +1,7 @@
 // The test program's general heap, replaced: while a test asks for it, operator new allocates
 // from an arena at a fixed place. Equal calls give equal addresses, of eight hexadecimal
-// digits at 4-byte pointers and twelve at 8-byte pointers, on every platform and in every run.
+// digits at 4-byte pointers and twelve at 8-byte pointers, on every platform and in every run; with
+// VOK_MEMPOOL_LOW_ARENA defined they have eight at each width.
 #ifndef VOK_MEMPOOL_TESTS_ARENAHEAP_H
 #define VOK_MEMPOOL_TESTS_ARENAHEAP_H
 
