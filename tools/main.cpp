@@ -22,6 +22,7 @@ int Run(int argc, char** argv) {
   Tools::AddReport(app);
   Tools::AddPicture(app);
   Tools::AddTrace(app);
+  Tools::AddChart(app);
   try {
     app.parse(argc, argv);
   } catch (const CLI::Success& help) {

@@ -44,12 +44,9 @@ PictureSource Read(const std::string& file) {
 
 void Run(const Options& options) {
   const PictureSource report = Read(options.report);
-  std::string data;
-  if (options.other.empty())
-    data = PictureData(nullptr, report);
-  else
-    data = PictureData(&report, Read(options.other));
-  const std::string page = fmt::format("{}{}{}", pageStart, data, pageEnd);
+  const std::string page =
+      FillPage(picturePage, options.other.empty() ? PictureData(nullptr, report)
+                                                  : PictureData(&report, Read(options.other)));
   if (options.out == "-")
     Print(page);
   else

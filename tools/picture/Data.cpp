@@ -253,7 +253,7 @@ private:
 
 } // namespace
 
-std::string PictureData(const PictureSource* before, const PictureSource& now) {
+Json PictureData(const PictureSource* before, const PictureSource& now) {
   const bool isPair = before != nullptr;
   Json json = {{"files", Json::array()}, {"pools", Json::array()}};
   if (isPair) json["files"].push_back(before->name);
@@ -263,14 +263,7 @@ std::string PictureData(const PictureSource* before, const PictureSource& now) {
                            [](const Report& report) { return report.name; });
   for (const Pair<Report>& pool : pools)
     json["pools"].push_back(PoolData(pool, isPair).Get());
-  const std::string text = json.dump(-1, ' ', false, Json::error_handler_t::replace);
-  std::string safe; // a name must not end the script element
-  for (const char c : text)
-    if (c == '<')
-      safe += "\\u003c";
-    else
-      safe += c;
-  return safe;
+  return json;
 }
 
 } // namespace VOK::MemPool::Tools

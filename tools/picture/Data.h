@@ -4,10 +4,10 @@
 #ifndef VOK_MEMPOOL_TOOLS_PICTURE_DATA_H
 #define VOK_MEMPOOL_TOOLS_PICTURE_DATA_H
 
+#include "common/Page.h"
 #include "report/Model.h"
 
 #include <string>
-#include <string_view>
 #include <vector>
 
 namespace VOK::MemPool::Tools {
@@ -17,12 +17,10 @@ struct PictureSource {
   std::vector<Report> reports;
 };
 
-/// `before` may be null. The text is safe within a script element of a page.
-std::string PictureData(const PictureSource* before, const PictureSource& now);
+/// `before` may be null.
+nlohmann::ordered_json PictureData(const PictureSource* before, const PictureSource& now);
 
-// The page without its data. The build makes the source of these from the page's files.
-extern const std::string_view pageStart; ///< up to the data
-extern const std::string_view pageEnd;   ///< from the end of the data
+extern const Page picturePage;
 
 } // namespace VOK::MemPool::Tools
 

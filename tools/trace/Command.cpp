@@ -3,7 +3,7 @@
 #include "common/Commands.h"
 #include "common/Failure.h"
 #include "common/Files.h"
-#include "trace/Massif.h"
+#include "trace/History.h"
 #include "trace/Replay.h"
 #include "trace/Summary.h"
 
@@ -18,7 +18,7 @@ namespace VOK::MemPool::Tools {
 namespace {
 
 struct Options {
-  std::string file = "-", massif;
+  std::string file = "-", massif, massifPools;
   bool json = false, detailed = false, off = false, keepEmptyBuckets = false;
   std::vector<std::string> names;
   std::uint64_t at = 0;
@@ -50,8 +50,8 @@ void ApplySettings(const Options& options) {
   if (options.keepEmptyBuckets) ZOR_VOK_MEMPOOL_KEEP_EMPTY_BUCKETS(true);
 }
 
-/// Reads all lines, or those up to `last` if that isn't 0; `take` gets each event with what the
-/// ledger finds. Returns the number of lines.
+/// Reads all lines, or those up to `last` if that isn't 0; `take` gets each event with its line and
+/// what the ledger finds. Returns the number of lines.
 template <class Take>
 std::uint64_t ReadTrace(const Options& options, TraceLedger& ledger, std::uint64_t last,
                         Take take) {
@@ -63,7 +63,7 @@ std::uint64_t ReadTrace(const Options& options, TraceLedger& ledger, std::uint64
     TraceEvent event;
     const LineKind kind = ReadTraceLine(line, event);
     if (kind == LineKind::Event && isWhole)
-      take(event, ledger.Take(number, event));
+      take(number, event, ledger.Take(number, event));
     else if (kind != LineKind::Other)
       ledger.TakeMixed(number, line);
     return number != last;
@@ -93,9 +93,10 @@ void ShowPoolsAt(const Options& options) {
   ApplySettings(options);
   TraceLedger ledger;
   Replay replay(names);
-  const std::uint64_t numLines =
-      ReadTrace(options, ledger, options.at,
-                [&](const TraceEvent& event, const auto& verdict) { replay.Take(event, verdict); });
+  const std::uint64_t numLines = ReadTrace(
+      options, ledger, options.at, [&](LineNumber, const TraceEvent& event, const auto& verdict) {
+        replay.Take(event, verdict);
+      });
   if (numLines < options.at)
     throw Failure(
         fmt::format("{}: it has no line {}, only {}", options.file, options.at, numLines));
@@ -103,17 +104,28 @@ void ShowPoolsAt(const Options& options) {
   replay.Print(options.detailed);
 }
 
+void WriteMassif(const Options& options, const std::vector<History::Snapshot>& snapshots,
+                 const TraceLedger& ledger, const PoolNames& names) {
+  if (!options.massif.empty())
+    WriteFile(options.massif, MassifText(snapshots, ledger, names, options.file));
+  if (options.massifPools.empty()) return;
+  const auto texts = MassifTextsOfPools(snapshots, names, options.file);
+  for (std::size_t i = 0; i < texts.size(); ++i)
+    WriteFile(fmt::format("{}.{}", options.massifPools, i + 1), texts[i]);
+}
+
 void Run(const Options& options) {
   if (options.at != 0) return ShowPoolsAt(options);
   const PoolNames names = NamesOf(options);
   TraceLedger ledger;
-  Massif massif;
+  History history;
   const std::uint64_t numLines =
-      ReadTrace(options, ledger, 0, [&](const TraceEvent&, const auto&) { massif.Sample(ledger); });
+      ReadTrace(options, ledger, 0, [&](LineNumber line, const TraceEvent&, const auto&) {
+        history.Sample(line, ledger);
+      });
   if (ledger.numEvents == 0 && ledger.mixed.count == 0)
     throw Failure(fmt::format("{}: there is no trace line in it", options.file));
-  if (!options.massif.empty())
-    WriteFile(options.massif, massif.GetText(ledger, names, options.file));
+  WriteMassif(options, history.GetSnapshots(numLines, ledger), ledger, names);
   if (options.json)
     WriteTraceJson(ledger, numLines, names, Print);
   else
@@ -136,6 +148,10 @@ void AddTrace(CLI::App& app) {
           ->check(CLI::Range(std::uint64_t{1}, UINT64_MAX));
   command->add_flag("--json", options->json, "a JSON document")->excludes(at);
   command->add_option("--massif", options->massif, "also write a file for ms_print")->excludes(at);
+  command
+      ->add_option("--massif-pools", options->massifPools,
+                   "also write a file for each pool: this name with .1, .2 and so on")
+      ->excludes(at);
   const auto setting = [&](CLI::Option* option) { option->needs(at)->group("With --at"); };
   setting(command->add_flag("--detailed", options->detailed, "each bucket with its records"));
   setting(command->add_flag("--off", options->off, "the program's pooling was off"));

@@ -1,5 +1,5 @@
 # Joins a page and the files that it names into a source with two texts: what precedes the page's
-# data, and what follows. Arguments: PAGE, OUTPUT.
+# data, and what follows. Arguments: PAGE, NAME, OUTPUT.
 get_filename_component(folder ${PAGE} DIRECTORY)
 file(READ ${PAGE} page)
 
@@ -17,23 +17,25 @@ endfunction()
 embed("<link rel=\"stylesheet\" href=\"[a-z]+\\.css\">" "<style>" "</style>")
 embed("<script src=\"[a-z]+\\.js\"></script>" "<script>" "</script>")
 
-set(data "{\"files\": [], \"pools\": []}")
-string(FIND "${page}" "${data}" begin)
-if(begin EQUAL -1)
-  message(FATAL_ERROR "${PAGE} has no place for its data: ${data}")
+# What stands there lets the page's files be opened as they are.
+if(NOT page MATCHES "(<script type=\"application/json\" id=\"data\">)([^<]*)<")
+  message(FATAL_ERROR "${PAGE} has no place for its data")
 endif()
-string(LENGTH "${data}" length)
+string(LENGTH "${CMAKE_MATCH_1}" before)
+string(LENGTH "${CMAKE_MATCH_2}" length)
+string(FIND "${page}" "${CMAKE_MATCH_1}" begin)
+math(EXPR begin "${begin} + ${before}")
 math(EXPR end "${begin} + ${length}")
 string(SUBSTRING "${page}" 0 ${begin} start)
 string(SUBSTRING "${page}" ${end} -1 rest)
 
 file(WRITE ${OUTPUT} "// Made from ${PAGE}.
-#include \"picture/Data.h\"
+#include \"common/Page.h\"
 
 namespace VOK::MemPool::Tools {
 
-const std::string_view pageStart = R\"page(${start})page\";
-const std::string_view pageEnd = R\"page(${rest})page\";
+extern const Page ${NAME}Page;
+const Page ${NAME}Page = {R\"page(${start})page\", R\"page(${rest})page\"};
 
 } // namespace VOK::MemPool::Tools
 ")

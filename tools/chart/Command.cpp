@@ -1,0 +1,90 @@
+// vokmempool chart: draws the pools over time as one page that a browser opens from a file.
+// Test: tests/tools/chart_test.py.
+#include "chart/Series.h"
+#include "common/Commands.h"
+#include "common/Failure.h"
+#include "common/Files.h"
+#include "common/Page.h"
+#include "report/Reader.h"
+
+#include <CLI/CLI.hpp>
+#include <filesystem>
+#include <fmt/format.h>
+#include <memory>
+
+namespace VOK::MemPool::Tools {
+
+extern const Page chartPage;
+
+namespace {
+
+struct Options {
+  std::string file = "-", out;
+};
+
+Series SeriesOfTrace(std::string_view text) {
+  TraceLedger ledger;
+  History history;
+  LineNumber line = 0;
+  while (!text.empty()) {
+    ++line;
+    const std::size_t end = text.find('\n');
+    TraceEvent event;
+    if (end != text.npos && ReadTraceLine(text.substr(0, end), event) == LineKind::Event) {
+      ledger.Take(line, event);
+      history.Sample(line, ledger);
+    }
+    text.remove_prefix(end == text.npos ? text.size() : end + 1);
+  }
+  return SeriesOf(history.GetSnapshots(line, ledger), {});
+}
+
+nlohmann::ordered_json DataOf(const Series& series, const std::string& source) {
+  nlohmann::ordered_json data = {{"source", source}, {"lines", series.lines}};
+  auto& pools = data["pools"] = nlohmann::ordered_json::array();
+  for (const PoolSeries& pool : series.pools) {
+    auto points = nlohmann::ordered_json::array();
+    for (const PoolSeries::Point& point : pool.points) {
+      const nlohmann::ordered_json held =
+          point.held ? nlohmann::ordered_json(*point.held) : nullptr;
+      points.push_back({point.place, held, point.payload});
+    }
+    pools.push_back({{"name", pool.name}, {"points", std::move(points)}});
+  }
+  return data;
+}
+
+void Run(const Options& options) {
+  const std::string text = Input(options.file).ReadAll();
+  const std::vector<Report> reports = ReadReports(text);
+  const Series series = reports.empty() ? SeriesOfTrace(text) : SeriesOf(reports);
+  if (series.pools.empty())
+    throw Failure(
+        fmt::format("{}: there is neither a report nor a trace line in it", options.file));
+  const std::string source = options.file == "-"
+                                 ? "standard input"
+                                 : std::filesystem::path(options.file).filename().string();
+  const std::string page = FillPage(chartPage, DataOf(series, source));
+  if (options.out == "-")
+    Print(page);
+  else
+    WriteFile(options.out, page);
+}
+
+} // namespace
+
+void AddChart(CLI::App& app) {
+  const auto options = std::make_shared<Options>();
+  CLI::App* const command =
+      app.add_subcommand("chart", "Draws the pools over time as a page for the browser");
+  command->add_option("FILE", options->file,
+                      "an output with several reports of each pool, or with trace lines; - for "
+                      "standard input");
+  command->add_option("-o,--output", options->out, "the page to write, - for standard output")
+      ->required();
+  command->footer("Example: which pool grows?\n"
+                  "  ./program > out.txt; vokmempool chart out.txt -o growth.html");
+  command->callback([options] { Run(*options); });
+}
+
+} // namespace VOK::MemPool::Tools
