@@ -12,6 +12,7 @@ namespace VOK::MemPool::Tools {
 void AddReport(CLI::App& app);
 void AddPicture(CLI::App& app);
 void AddTrace(CLI::App& app);
+void AddInspect(CLI::App& app);
 
 } // namespace VOK::MemPool::Tools
 
