@@ -1,5 +1,5 @@
-// vokmempool: reads what pools print. Exit status 0: done; 1: a failure, with one line on the error
-// stream; 2: bad arguments.
+// vokmempool: reads what pools print, and pools. Exit status 0: done; 1: a failure, with one line
+// on the error stream; 2: bad arguments.
 #include "common/Commands.h"
 #include "common/Failure.h"
 #include "common/Files.h"
@@ -15,14 +15,16 @@ namespace {
 using namespace VOK::MemPool;
 
 int Run(int argc, char** argv) {
-  CLI::App app("Reads the reports and the trace lines that pools of libVokMemPool print.",
-               "vokmempool");
+  CLI::App app(
+      "Reads the reports and the trace lines of pools of libVokMemPool, and the pools themselves.",
+      "vokmempool");
   app.require_subcommand(1);
   app.footer("Help on a subcommand: vokmempool SUBCOMMAND --help");
   Tools::AddReport(app);
   Tools::AddPicture(app);
   Tools::AddTrace(app);
   Tools::AddChart(app);
+  Tools::AddInspect(app);
   try {
     app.parse(argc, argv);
   } catch (const CLI::Success& help) {

@@ -23,9 +23,6 @@ namespace VOK::MemPool {
 
 namespace {
 
-/// The smallest bucket size that is worth a pool: a printed figure, nothing tests it.
-constexpr std::uint32_t minBucketSize = 128;
-
 struct Figures {
   std::uint32_t usedRecs = 0;
   std::uint32_t freeRecs = 0;

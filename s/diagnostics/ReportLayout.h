@@ -56,6 +56,9 @@ inline constexpr Column extRecs[] = {{"Id", 5},       {"Length", 7}, {"Data Ptr"
                                      {"Heap Ptr", 8}, {"Next", 8},   {"Prev", 8}};
 } // namespace PoolColumns
 
+/// The smallest bucket size that is worth a pool: a printed figure, nothing tests it.
+inline constexpr unsigned minBucketSize = 128;
+
 namespace BucketTitle {
 inline constexpr const char* bucket = "MemPool::Bucket #";
 inline constexpr const char* records = " ALL RECORDS (";

@@ -3,6 +3,7 @@
 // nothing else ensures that the registry and the settings exist before the first Mgr. Of the static
 // library a linker takes this unit along with any other, since all lines need its streams.
 // Test: tests/process_test.py, scripts/checks/library, scripts/checks/install.
+#include "base/KeepStores.h"
 #include "services/MgrRegistry.h"
 #include "services/Observers.h"
 #include "services/Output.h"
@@ -20,10 +21,17 @@
 
 namespace VOK::MemPool {
 
+struct Layout;
+extern const Layout layout; // defined by the diagnostics, which know all that it describes
+
 namespace {
 
+// The registry takes along what describes it, in a program that the static library is linked with.
 struct RegistryLife {
-  RegistryLife() { MgrRegistry::Begin(); }
+  RegistryLife() {
+    MgrRegistry::Begin();
+    KeepStores(&layout);
+  }
   ~RegistryLife() { MgrRegistry::End(); }
 };
 

@@ -7,9 +7,11 @@
 #include <cstddef>
 #include <cstdint>
 #include <functional>
+#include <iterator>
 #include <map>
 #include <mutex>
 #include <new>
+#include <utility>
 
 #ifdef __unix__
 #include <pthread.h>
@@ -19,7 +21,7 @@ namespace VOK::MemPool::MgrRegistry {
 
 namespace {
 
-using Map = std::map<std::string, BucketMgr*, std::less<>>;
+using Map = std::map<std::string, Entry, std::less<>>;
 using Lock = std::lock_guard<std::mutex>;
 
 struct Registry {
@@ -34,7 +36,15 @@ Registry& Shared() { return *std::launder(reinterpret_cast<Registry*>(storage));
 
 std::atomic<std::uint32_t> nextMgrId = 1;
 
+/// The pointer that leads to an entry of the map: the head of the list, or that of the entry
+/// before.
+Entry*& LinkTo(Map::iterator entry) {
+  return entry == Shared().pools.begin() ? first : std::prev(entry)->second.next;
+}
+
 } // namespace
+
+Entry* first = nullptr;
 
 // A child process has the one thread that forked. If another one held the lock in that moment,
 // nobody would release it there: so the fork waits for it.
@@ -50,6 +60,7 @@ void End() noexcept {
   Map left;
   const Lock lock(Shared().mutex);
   left.swap(Shared().pools);
+  first = nullptr;
 }
 
 bool Contains(std::string_view name) {
@@ -60,7 +71,7 @@ bool Contains(std::string_view name) {
 Mgr* Find(std::string_view name) {
   const Lock lock(Shared().mutex);
   const auto entry = Shared().pools.find(name);
-  return entry != Shared().pools.end() ? HandleOf(entry->second) : nullptr;
+  return entry != Shared().pools.end() ? HandleOf(entry->second.pool) : nullptr;
 }
 
 unsigned Count() {
@@ -75,25 +86,30 @@ std::vector<Mgr*> Handles() {
     handles.reserve(Count());
     const Lock lock(Shared().mutex);
     if (Shared().pools.size() > handles.capacity()) continue;
-    for (const auto& [name, pool] : Shared().pools)
-      handles.push_back(HandleOf(pool));
+    for (const Entry* entry = first; entry != nullptr; entry = entry->next)
+      handles.push_back(HandleOf(entry->pool));
     return handles;
   }
 }
 
 bool Enter(const std::string& name, BucketMgr* pool) {
   Map made;
-  made.emplace(name, pool);
+  const auto entry = made.emplace(name, Entry{nullptr, pool, nullptr}).first;
+  entry->second.name = entry->first.c_str();
   const Lock lock(Shared().mutex);
   Shared().pools.merge(made);
-  return made.empty();
+  if (!made.empty()) return false;
+  entry->second.next = std::exchange(LinkTo(entry), &entry->second);
+  return true;
 }
 
 void Remove(std::string_view name) noexcept {
   Map::node_type gone;
   const Lock lock(Shared().mutex);
   const auto entry = Shared().pools.find(name);
-  if (entry != Shared().pools.end()) gone = Shared().pools.extract(entry);
+  if (entry == Shared().pools.end()) return;
+  LinkTo(entry) = entry->second.next;
+  gone = Shared().pools.extract(entry);
 }
 
 std::string NextAutomaticName() {

@@ -4,6 +4,8 @@
 #ifndef VOK_MEMPOOL_MGRREGISTRY_H
 #define VOK_MEMPOOL_MGRREGISTRY_H
 
+#include "base/Attributes.h"
+
 #include <string>
 #include <string_view>
 #include <vector>
@@ -16,6 +18,16 @@ struct BucketMgr;
 /// Any thread may call these at any time. The lock is held for no allocation and no release, since
 /// a program's own heap and its new-handler may come back here; it is held during a fork.
 namespace MgrRegistry {
+
+/// A pool under its name. The entries are a list by ascending name, which another process follows
+/// without knowledge of the map.
+struct Entry {
+  const char* name;
+  BucketMgr* pool;
+  Entry* next;
+};
+
+extern VOK_HIDDEN Entry* first; ///< null while there is no pool
 
 /// Constructs the map, empty. Called once, before anything else of the library.
 void Begin();

@@ -24,8 +24,6 @@ bool endsAtFinding;
 
 namespace {
 
-const char* const version = "$Id: MemPool,v 1.2.52.4 2009/08/10 21:28:15 qrt Exp $";
-
 bool bannerWanted;
 
 /// A setting and its environment key. A number that fails its test is dropped without a message.

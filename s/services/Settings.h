@@ -11,6 +11,9 @@
 
 namespace VOK::MemPool::Settings {
 
+/// The text of GetVersion, which names the form of the reports and no release.
+inline constexpr char version[] = "$Id: MemPool,v 1.2.52.4 2009/08/10 21:28:15 qrt Exp $";
+
 extern VOK_HIDDEN std::uint32_t bucketSize;
 extern VOK_HIDDEN std::uint16_t dataAlignment;
 extern VOK_HIDDEN std::uint32_t maxRecordSize;

@@ -17,7 +17,10 @@ static void* dlsym(void* library, const char* name) {
 }
 static void dlclose(void* library) { FreeLibrary(static_cast<HMODULE>(library)); }
 #else
+#include <csignal>
 #include <dlfcn.h>
+#include <sys/wait.h>
+#include <unistd.h>
 #endif
 
 using namespace VOK::MemPool;
@@ -100,6 +103,10 @@ constexpr struct {
     {"cut", [](State&) { std::_Exit(7); }}, // flushes no stream
     {"open", Open},
     {"close", [](State&) { dlclose(handle), actOfClient = nullptr; }},
+#ifndef _WIN32
+    {"core", [](State&) { fork() == 0 ? std::abort() : static_cast<void>(wait(nullptr)); }},
+    {"stop", [](State&) { std::raise(SIGSTOP); }},
+#endif
 #ifndef VOK_MEMPOOL_HOST
     {"set", [](State& s) { Set(s.operand); }},
     {"pool", [](State& s) { s.pools.push_back(new Mgr(s.operand.c_str())); }},

@@ -13,6 +13,7 @@ void AddReport(CLI::App& app);
 void AddPicture(CLI::App& app);
 void AddTrace(CLI::App& app);
 void AddChart(CLI::App& app);
+void AddInspect(CLI::App& app);
 
 } // namespace VOK::MemPool::Tools
 

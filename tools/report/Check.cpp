@@ -1,6 +1,8 @@
 // The check of a pool's header block, histogram and tables against each other.
 #include "report/Check.h"
 
+#include "common/Failure.h"
+#include "common/Files.h"
 #include "report/Checker.h"
 #include "report/Form.h"
 
@@ -246,6 +248,17 @@ std::vector<Inconsistency> CheckReport(const Report& report) {
       checker.found.begin(), checker.found.end(),
       [](const Inconsistency& a, const Inconsistency& b) { return a.place.line < b.place.line; });
   return checker.found;
+}
+
+void PrintInconsistencies(const std::vector<Report>& reports, const std::string& source) {
+  std::size_t count = 0;
+  for (const Report& report : reports)
+    for (const Inconsistency& inconsistency : CheckReport(report)) {
+      Print(fmt::format("line {}: {}\n", inconsistency.place.line, inconsistency.text));
+      ++count;
+    }
+  if (count > 0)
+    throw Failure(fmt::format("{}: {} inconsistenc{}", source, count, count == 1 ? "y" : "ies"));
 }
 
 } // namespace VOK::MemPool::Tools

@@ -28,6 +28,10 @@ struct Inconsistency {
 /// The inconsistencies of a report by line. A report of an undamaged pool has none.
 std::vector<Inconsistency> CheckReport(const Report& report);
 
+/// Prints the inconsistencies of all reports with their lines. Fails if there are any; the source's
+/// name begins the message.
+void PrintInconsistencies(const std::vector<Report>& reports, const std::string& source);
+
 } // namespace VOK::MemPool::Tools
 
 #endif

@@ -1,7 +1,6 @@
 // vokmempool report: finds the reports in a text and shows them in the form asked for.
 // Test: tests/tools/tools_test.py.
 #include "common/Commands.h"
-#include "common/Failure.h"
 #include "common/Files.h"
 #include "report/Check.h"
 #include "report/Json.h"
@@ -10,7 +9,6 @@
 #include "report/Writer.h"
 
 #include <CLI/CLI.hpp>
-#include <fmt/format.h>
 #include <memory>
 
 namespace VOK::MemPool::Tools {
@@ -22,23 +20,12 @@ struct Options {
   bool json = false, summary = false, check = false, text = false, fromJson = false;
 };
 
-void Check(const std::vector<Report>& reports, const std::string& file) {
-  std::size_t count = 0;
-  for (const Report& report : reports)
-    for (const Inconsistency& inconsistency : CheckReport(report)) {
-      Print(fmt::format("line {}: {}\n", inconsistency.place.line, inconsistency.text));
-      ++count;
-    }
-  if (count > 0)
-    throw Failure(fmt::format("{}: {} inconsistenc{}", file, count, count == 1 ? "y" : "ies"));
-}
-
 void Run(const Options& options) {
   const std::vector<Report> reports = ReadReportFile(options.file, options.fromJson);
   if (options.json)
     WriteJson(reports, Print);
   else if (options.check)
-    Check(reports, options.file);
+    PrintInconsistencies(reports, options.file);
   else if (options.text)
     for (const Report& report : reports)
       Print(WriteReport(report));

@@ -24,14 +24,15 @@ Bytes BytesOf(const Report& report) {
   return bytes;
 }
 
-std::string Summarise(const std::vector<Report>& reports) {
+std::string Summarise(const std::vector<Report>& reports, const std::vector<std::string>& marks) {
   constexpr auto form = "{:<{}} {:>10} {:>10} {:>10} {:>13} {:>13} {:>8}{}\n";
   std::size_t width = 4;
   for (const Report& report : reports)
     width = std::max(width, OneLine(report.name).size());
   std::string text =
       fmt::format(form, "pool", width, "used", "free", "ext", "bytes held", "payload", "share", "");
-  for (const Report& report : reports) {
+  for (std::size_t i = 0; i < reports.size(); ++i) {
+    const Report& report = reports[i];
     const Bytes bytes = BytesOf(report);
     const std::string share =
         bytes.held == 0 ? "-"
@@ -39,7 +40,7 @@ std::string Summarise(const std::vector<Report>& reports) {
                                                       static_cast<double>(bytes.held));
     text += fmt::format(form, OneLine(report.name), width, report.usedRecs, report.freeRecs,
                         report.numExtRecs, bytes.held, bytes.payload, share,
-                        report.IsOff() ? " off" : "");
+                        (report.IsOff() ? " off" : "") + (marks.empty() ? "" : marks[i]));
   }
   return text;
 }

@@ -18,8 +18,9 @@ struct Bytes {
 
 Bytes BytesOf(const Report& report);
 
-/// A table with a row for each report.
-std::string Summarise(const std::vector<Report>& reports);
+/// A table with a row for each report; `marks` ends the rows.
+std::string Summarise(const std::vector<Report>& reports,
+                      const std::vector<std::string>& marks = {});
 
 } // namespace VOK::MemPool::Tools
 
