@@ -36,6 +36,18 @@ endforeach()
 install(FILES docs/man/libVokMemPool.7
   DESTINATION ${CMAKE_INSTALL_MANDIR}/man7 COMPONENT development)
 
+# gdb loads it with the shared library, by the library's whole name: from its own folder, or from
+# beside the library.
+get_target_property(VOK_MEMPOOL_TYPE VokMemPool TYPE)
+if(VOK_MEMPOOL_TYPE STREQUAL "SHARED_LIBRARY" AND CMAKE_SYSTEM_NAME STREQUAL "Linux")
+  set(VOK_MEMPOOL_GDB_FOLDER ${CMAKE_INSTALL_LIBDIR})
+  if(CMAKE_INSTALL_PREFIX STREQUAL "/usr")
+    set(VOK_MEMPOOL_GDB_FOLDER ${CMAKE_INSTALL_DATADIR}/gdb/auto-load${CMAKE_INSTALL_FULL_LIBDIR})
+  endif()
+  install(FILES tools/gdb/libVokMemPool-gdb.py DESTINATION ${VOK_MEMPOOL_GDB_FOLDER}
+    RENAME libVokMemPool.so.${PROJECT_VERSION}-gdb.py COMPONENT development)
+endif()
+
 # pkg-config finds the prefix from where the file lies, so both folders must lie below it.
 if(IS_ABSOLUTE "${CMAKE_INSTALL_LIBDIR}" OR IS_ABSOLUTE "${CMAKE_INSTALL_INCLUDEDIR}")
   message(FATAL_ERROR "CMAKE_INSTALL_LIBDIR and CMAKE_INSTALL_INCLUDEDIR are folders below the prefix")
