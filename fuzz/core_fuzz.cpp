@@ -1,12 +1,11 @@
 // Hostile core files for the reader of pools: it ends, and what it shows of a damaged pool is a
 // report that can be written, checked and summarised.
 #include "Target.h"
-#include "common/Failure.h"
+#include "common/Tool.h"
 #include "inspect/Pools.h"
 #include "report/Check.h"
-#include "report/Json.h"
+#include "report/Formats.h"
 #include "report/Summary.h"
-#include "report/Writer.h"
 
 #include <vector>
 

@@ -1,24 +1,53 @@
 // vokmempool: reads what pools print, and pools. Exit status 0: done; 1: a failure, with one line
 // on the error stream; 2: bad arguments.
-#include "common/Commands.h"
-#include "common/Failure.h"
 #include "common/Files.h"
+#include "common/Tool.h"
 
 #include <CLI/CLI.hpp>
+#include <algorithm>
 #include <csignal>
 #include <cstdio>
 #include <exception>
 #include <fmt/format.h>
+#include <numeric>
+#include <string>
+#include <utility>
+#include <vector>
 
 namespace {
 
 using namespace VOK::MemPool;
+
+/// How many characters differ at least.
+std::size_t DistanceOf(const std::string& a, const std::string& b) {
+  std::vector<std::size_t> row(b.size() + 1);
+  std::iota(row.begin(), row.end(), 0);
+  for (std::size_t i = 0; i < a.size(); ++i) {
+    std::size_t diagonal = std::exchange(row[0], i + 1);
+    for (std::size_t j = 0; j < b.size(); ++j)
+      diagonal = std::exchange(
+          row[j + 1], std::min({row[j + 1] + 1, row[j] + 1, diagonal + (a[i] == b[j] ? 0 : 1)}));
+  }
+  return row.back();
+}
+
+/// What is wrong with the arguments; for a mistyped subcommand the nearest.
+std::string Explain(const CLI::App& app, const char* first, const CLI::ParseError& error) {
+  if (first == nullptr || *first == '-') return error.what();
+  const auto all = app.get_subcommands([](const CLI::App*) { return true; });
+  const auto distance = [&](const CLI::App* one) { return DistanceOf(first, one->get_name()); };
+  const auto* const nearest = *std::ranges::min_element(all, {}, distance);
+  return distance(nearest) == 0 ? error.what()
+                                : fmt::format("there is no subcommand {}, the nearest is {}", first,
+                                              nearest->get_name());
+}
 
 int Run(int argc, char** argv) {
   CLI::App app(
       "Reads the reports and the trace lines of pools of libVokMemPool, and the pools themselves.",
       "vokmempool");
   app.require_subcommand(1);
+  app.set_version_flag("--version", "vokmempool " VOK_MEMPOOL_VERSION);
   app.footer("Help on a subcommand: vokmempool SUBCOMMAND --help");
   Tools::AddReport(app);
   Tools::AddPicture(app);
@@ -31,7 +60,7 @@ int Run(int argc, char** argv) {
     return app.exit(help);
   } catch (const CLI::ParseError& error) {
     fmt::print(stderr, "vokmempool: {}\nusage: vokmempool SUBCOMMAND [OPTIONS] [FILE]\n",
-               error.what());
+               Explain(app, argv[1], error));
     return 2;
   }
   return 0;

@@ -71,4 +71,4 @@ with tempfile.TemporaryDirectory() as folder, Browser(sys.argv[3]) as chromium, 
     test_trace(chromium)
     same(chromium.messages, [], "messages in the console")
     same(run(PROGRAM, "chart", "-o", "-", given="nothing\n")[1:],
-         ("vokmempool: -: there is neither a report nor a trace line in it\n", 1), "nothing to draw")
+         ("vokmempool: standard input: there is neither a report nor a trace line in it\n", 1), "nothing to draw")

@@ -22,7 +22,7 @@ GOLDEN = Path(sys.argv[3]).resolve()
 REPORTS = {path.stem: path.read_text() for path in (GOLDEN / "report").iterdir()}
 DEMO, DETAILED = REPORTS["demo"], REPORTS["detailed"]
 USAGE = "\nusage: vokmempool SUBCOMMAND [OPTIONS] [FILE]\n"
-PLAIN = "-: line 1: a plain report, which has no records to draw"
+PLAIN = "standard input: line 1: a plain report, which has no records to draw"
 TRACE = """zvpt:c:a0
 zvpt:a:a0:1000:24
 zvpt:f:a0:1:
@@ -40,33 +40,46 @@ NAMED = "trace", "--name", "a0=cache"
 COMMANDS = [
     ("", "", 2, "", "A subcommand is required" + USAGE),
     ("--help", "", 0, "*SUBCOMMAND --help*", ""),
-    *((f"{name} --help", "", 0, "*Example: *", "") for name in ("report", "picture", "trace")),
+    *((f"{name} --help", "", 0, "*Example: *", "") for name in ("report", "picture", "trace", "chart")),
+    ("--version", "", 0, "vokmempool 1.*", ""),
+    ("reprot", "", 2, "", "there is no subcommand reprot, the nearest is report" + USAGE),
     ("report --json --check", "", 2, "", "*[--summary,--json,--check,--text]" + USAGE),
     ("report /no/such", "", 1, "", "/no/such: can't be opened: No such file or directory\n"),
     ("report /", "", 1, "", "/: can't be read: Is a directory\n"),
     ("report", "MemPool::Mgr a\n" + 60 * "x", 1, "",
-     "-: line 2: expected \"   Version     : \"*, found \"" + 60 * "x" + "\"\n"),
+     "standard input: line 2: expected \"   Version     : \"*, found \"" + 60 * "x" + "\"\n"),
+    ("report --from-json", '{"reports":\n [}', 1, "",
+     "standard input: not a JSON document: line 2, column 3\n"),
+    ("report --from-json", '{"report": []}', 1, "",
+     'standard input: not a document of reports: it lacks "reports"\n'),
     ("report --from-json", '{"other": [{}], "reports": []}', 1, "",
-     "-: there is no report in it\n"),
+     "standard input: there is no report in it\n"),
     ("report", DEMO.replace(" demo", " de\tmo") + DETAILED, 0, """\
 pool           used       free        ext    bytes held       payload    share
 de\\x09mo        508        280          2         19596          9860   50.3 %
 detailed         25         27          3      12349804      12349032  100.0 %
 """, ""),
     ("report", DEMO.replace("Enabled     :        1", "Enabled     :        0"), 0,
-     "*\ndemo * 50.3 % off\n", ""),
+     "*\ndemo * 50.3 % off\n", "*--check lists them\n"),
     ("report --check", DEMO.replace("  508\n", "  509\n"), 1,
-     "line 10: Used Recs is 509, not 508: the sum of Used in BUCKETS\n", "-: 1 inconsistency\n"),
+     "line 10: Used Recs is 509, not 508: the sum of Used in BUCKETS\n", "standard input: 1 inconsistency\n"),
     ("report --check", DEMO.replace(" 2000 ", " 2001 ", 1), 1,
-     "line *\nline *\n", "-: 2 inconsistencies\n"),
+     "line *\nline *\n", "standard input: 2 inconsistencies\n"),
+    ("report", DEMO.replace("  508\n", "  509\n"), 0, "*\ndemo *",
+     "standard input: 1 inconsistency, --check lists them\n"),
+    ("report --check", DEMO * 2, 0, "2 reports, no contradiction\n", ""),
+    ("report --text", DEMO + DETAILED[:999], 1, DEMO, "standard input: line *: expected *"),
+    ("report --check", DEMO.replace("  508\n", "  509\n") + DETAILED[:999], 1, "line 10: *\n",
+     "standard input: 1 inconsistency; line *: expected *"),
     ("picture report.txt", "", 2, "", "--output is required" + USAGE),
     ("picture -o page.html", "", 2, "", "REPORT is required" + USAGE),
     ("picture - -o -", DETAILED, 0, "<!DOCTYPE html>\n*</html>\n", ""),
     ("picture - -o plain.html", DEMO, 1, "", PLAIN + "; DbgDetailed writes them\n"),
     ("picture - -o page.html", DEMO + DETAILED, 0, "", PLAIN + "\n"),
-    ("trace", "", 1, "", "-: there is no trace line in it\n"),
+    ("trace", "", 1, "", "standard input: there is no trace line in it\n"),
     ("trace --bucket-size 9", "", 2, "", "--bucket-size requires --at" + USAGE),
-    ("trace --at 0", "", 2, "", "--at: Value 0 not in range*"),
+    ("trace --at 0", "", 2, "", "--at: takes the number of a line, from 1 *, and not 0" + USAGE),
+    ("trace --at 1 --bucket-size 4294967296", "", 2, "", "--bucket-size: takes bytes, from 0 *"),
     ("trace --name cache", "", 2, "", "--name: takes POOL=NAME, *"),
     # Another record may have the replay's block of one that was cleared.
     ("trace --at 5", "zvpt:a:a0:1:24\nzvpt:a:a0:2:24\nzvpt:a:a0:1:24\nzvpt:a:a0:3:24\n"
@@ -79,7 +92,7 @@ detailed         25         27          3      12349804      12349032  100.0 %
      "\\x01: its first lines are not in the trace\n"
      "vokmempool: cache: a Clear lies between line 2 and line 6, the report is uncertain\n"
      "vokmempool: 2 mixed or cut lines were skipped, the first is line 10\n"),
-    ("trace --at 12", TRACE, 1, "", "-: it has no line 12, only 11\n"),
+    ("trace --at 12", TRACE, 1, "", "standard input: it has no line 12, only 11\n"),
     ("report --text > /dev/full", DEMO, 1, "", "standard output: can't be written*"),
     ("report --text | head -1", DEMO * 400, 0, "MemPool::Mgr demo\n", ""),
     ("trace < <(sleep 2.1; echo zvpt:c:a0)", "", 0, "1 lines, 1 *", ""),
@@ -130,10 +143,45 @@ CHANGES = [
 def messages_on(text, line, *options):
     """The messages on a text without their values, each with whether it names that line."""
     output, errors, _ = run(PROGRAM, "report", "--check", *options, given=text)
-    values = r"(?s)vokmempool: -: (\d+ inconsistenc.*)?|(, found |\[json).*"
+    values = r"(?s)vokmempool: standard input: (\d+ inconsistenc.*)?|(, found |\[json).*"
     for message in re.sub(values, "", output + errors).splitlines() or ["nothing"]:
         _, number, message = re.fullmatch("(line (\\d+): )?(.*)", message).groups()
         yield re.sub('".*"|0x[0-9a-f]+|\\d+', "#", message), number == str(line)
+
+
+def prefixed(text):
+    """As a log writes it, with another time in each line."""
+    lines = enumerate(text.splitlines())
+    return "".join(f"Nov 26 00:{i % 6000 // 60:02}:{i % 60:02} host program[71]: {line}".rstrip() + "\n"
+                   for i, line in lines)
+
+
+def interrupted(text):
+    """With lines of others, but for a title, whose name can have more than one."""
+    lines = text.splitlines(keepends=True)
+    return "".join(f"{line}other {i}\n" * (i % 9 == 5) or line for i, line in enumerate(lines))
+
+
+# A form of a text, and what a lenient reading passes over.
+FORMS = [
+    (prefixed, "a prefix on 515 lines, blanks missing at the end of * lines"),
+    (interrupted, "57 lines that no report has, the first is line 7"),
+    (lambda text: re.sub(" +$", "", text, flags=re.M), "blanks missing at the end of * lines"),
+    (lambda text: text.replace("\n", "\r\n", 300), "CR and LF at the end of 300 lines"),
+    (lambda text: prefixed(interrupted(text)), "57 lines that no report has, * a prefix on *"),
+]
+
+
+def test_lenient():
+    text = DEMO + DETAILED
+    for i, (form, passed) in enumerate(FORMS):
+        output, errors, status = run(PROGRAM, "report", "--lenient", "--text", given=form(text))
+        whole = f"vokmempool: standard input: passed over {passed}\n"
+        same((output, is_like(errors, whole), status), (text, True, 0), f"form {i}: {errors}")
+        # A report that isn't whole is named, and those around it are shown.
+        cut = form(DETAILED[:DETAILED.index("\n", 5000) + 1] + text)
+        output, errors, status = run(PROGRAM, "report", "--lenient", "--text", given=cut)
+        same((output, "expected" in errors, status), (text, True, 1), f"form {i} of a cut: {errors}")
 
 
 def changed_reports():
@@ -200,7 +248,8 @@ def test_library():
         front = "" if "two\nlines" in names else "and on: "  # a title in a line must be a whole one
         text = f"MemPool\n\n{front}{first}{work.output}"
         same(tool("report", "--text", given=text), first + first + second, "reports in an output")
-        same(run(PROGRAM, "report", "--check", given=text), ("", "", 0), f"seed {seed}")
+        same(run(PROGRAM, "report", "--check", given=text),
+             ("6 reports, no contradiction\n", "", 0), f"seed {seed}")
         data_of(first.replace("\n", "\r\n"))
         data = data_of(second)
         found = [bytes.fromhex(pool.get("nameBytes", "")).decode("latin-1") or pool["name"]
@@ -334,5 +383,6 @@ with tempfile.TemporaryDirectory() as folder:
     os.chdir(folder)
     test_commands()
     test_changes()
+    test_lenient()
     test_library()
     test_trace()

@@ -1,11 +1,10 @@
 // vokmempool chart: draws the pools over time as one page that a browser opens from a file.
 // Test: tests/tools/chart_test.py.
 #include "chart/Series.h"
-#include "common/Commands.h"
-#include "common/Failure.h"
 #include "common/Files.h"
 #include "common/Page.h"
-#include "report/Reader.h"
+#include "common/Tool.h"
+#include "report/Formats.h"
 
 #include <CLI/CLI.hpp>
 #include <filesystem>
@@ -56,14 +55,14 @@ nlohmann::ordered_json DataOf(const Series& series, const std::string& source) {
 
 void Run(const Options& options) {
   const std::string text = Input(options.file).ReadAll();
-  const std::vector<Report> reports = ReadReports(text);
-  const Series series = reports.empty() ? SeriesOfTrace(text) : SeriesOf(reports);
+  const std::string name = NameOfFile(options.file);
+  const ReportText found = ReadReports(text);
+  if (!found.cut.empty()) throw Failure(fmt::format("{}: {}", name, found.cut));
+  const Series series = found.reports.empty() ? SeriesOfTrace(text) : SeriesOf(found.reports);
   if (series.pools.empty())
-    throw Failure(
-        fmt::format("{}: there is neither a report nor a trace line in it", options.file));
-  const std::string source = options.file == "-"
-                                 ? "standard input"
-                                 : std::filesystem::path(options.file).filename().string();
+    throw Failure(fmt::format("{}: there is neither a report nor a trace line in it", name));
+  const std::string source =
+      options.file == "-" ? name : std::filesystem::path(options.file).filename().string();
   const std::string page = FillPage(chartPage, DataOf(series, source));
   if (options.out == "-")
     Print(page);

@@ -1,6 +1,6 @@
 #include "common/Files.h"
 
-#include "common/Failure.h"
+#include "common/Tool.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -19,13 +19,14 @@ namespace {
 
 } // namespace
 
+std::string NameOfFile(const std::string& path) { return path == "-" ? "standard input" : path; }
+
 void Input::Closer::operator()(std::FILE* open) const {
   if (open != stdin) std::fclose(open);
 }
 
 Input::Input(const std::string& path)
-    : name(path == "-" ? "standard input" : path),
-      file(path == "-" ? stdin : std::fopen(path.c_str(), "rb")) {
+    : name(NameOfFile(path)), file(path == "-" ? stdin : std::fopen(path.c_str(), "rb")) {
   if (file == nullptr) Fail(name, "can't be opened");
   std::error_code error;
   if (path != "-" && std::filesystem::is_regular_file(path, error)) {

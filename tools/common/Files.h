@@ -11,6 +11,9 @@
 
 namespace VOK::MemPool::Tools {
 
+/// What messages call a file: "-" is standard input.
+std::string NameOfFile(const std::string& path);
+
 /// A file to read, or standard input under the name "-".
 class Input {
 public:

@@ -1,6 +1,5 @@
 // vokmempool inspect where it can't be built.
-#include "common/Commands.h"
-#include "common/Failure.h"
+#include "common/Tool.h"
 
 #include <CLI/CLI.hpp>
 

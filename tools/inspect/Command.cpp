@@ -1,13 +1,11 @@
 // vokmempool inspect: the pools of a running process, or of a core file, without the program's
 // help. Test: tests/tools/inspect_test.py.
-#include "common/Commands.h"
-#include "common/Failure.h"
 #include "common/Files.h"
+#include "common/Tool.h"
 #include "inspect/Pools.h"
 #include "report/Check.h"
-#include "report/Json.h"
+#include "report/Formats.h"
 #include "report/Summary.h"
-#include "report/Writer.h"
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
@@ -87,7 +85,8 @@ void Run(const Options& options) {
   else if (options.check) {
     for (const std::string& damage : damages)
       Print(damage + "\n");
-    PrintInconsistencies(reports, options.source);
+    if (const std::string count = PrintInconsistencies(reports); !count.empty() && damages.empty())
+      throw Failure(fmt::format("{}: {}", options.source, count));
   } else
     Print(Summarise(reports, marks));
   if (!damages.empty())

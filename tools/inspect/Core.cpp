@@ -1,5 +1,5 @@
 // The memory that a core file holds.
-#include "common/Failure.h"
+#include "common/Tool.h"
 #include "inspect/Memory.h"
 
 #include <algorithm>

@@ -3,7 +3,7 @@
 #ifndef VOK_MEMPOOL_TOOLS_INSPECT_LIBRARY_H
 #define VOK_MEMPOOL_TOOLS_INSPECT_LIBRARY_H
 
-#include "common/Failure.h"
+#include "common/Tool.h"
 #include "diagnostics/Layout.h"
 #include "inspect/Memory.h"
 

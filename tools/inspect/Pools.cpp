@@ -2,7 +2,7 @@
 
 #include "inspect/Walk.h"
 #include "report/Form.h"
-#include "report/Writer.h"
+#include "report/Formats.h"
 
 #include <algorithm>
 #include <chrono>

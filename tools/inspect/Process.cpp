@@ -1,5 +1,5 @@
 // The memory of a running process.
-#include "common/Failure.h"
+#include "common/Tool.h"
 #include "inspect/Memory.h"
 
 #include <algorithm>

@@ -1,10 +1,9 @@
 // vokmempool picture: draws detailed reports as one page that a browser opens from a file.
 // Test: tests/tools/picture_test.py.
-#include "common/Commands.h"
-#include "common/Failure.h"
 #include "common/Files.h"
+#include "common/Tool.h"
 #include "picture/Data.h"
-#include "report/Reader.h"
+#include "report/Formats.h"
 
 #include <CLI/CLI.hpp>
 #include <filesystem>
@@ -26,12 +25,16 @@ bool IsPlain(const Report& report) {
 /// The reports of a file that have their records; those that lack them are named on the error
 /// stream, or are a failure if there is no other.
 PictureSource Read(const std::string& file) {
-  PictureSource source{
-      file == "-" ? "standard input" : std::filesystem::path(file).filename().string(), {}};
+  const std::string name = NameOfFile(file);
+  PictureSource source{file == "-" ? name : std::filesystem::path(file).filename().string(), {}};
   std::string plain;
-  for (Report& report : ReadReportFile(file))
+  ReportText text = ReadReports(Input(file).ReadAll());
+  if (!text.cut.empty() || text.reports.empty())
+    throw Failure(
+        fmt::format("{}: {}", name, text.cut.empty() ? "there is no report in it" : text.cut));
+  for (Report& report : text.reports)
     if (IsPlain(report))
-      plain += fmt::format("{}: line {}: a plain report, which has no records to draw\n", file,
+      plain += fmt::format("{}: line {}: a plain report, which has no records to draw\n", name,
                            report.line);
     else
       source.reports.push_back(std::move(report));

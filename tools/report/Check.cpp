@@ -1,7 +1,6 @@
 // The check of a pool's header block, histogram and tables against each other.
 #include "report/Check.h"
 
-#include "common/Failure.h"
 #include "common/Files.h"
 #include "report/Checker.h"
 #include "report/Form.h"
@@ -250,15 +249,34 @@ std::vector<Inconsistency> CheckReport(const Report& report) {
   return checker.found;
 }
 
-void PrintInconsistencies(const std::vector<Report>& reports, const std::string& source) {
+namespace {
+
+std::string Counted(std::size_t count) {
+  return count == 0   ? ""
+         : count == 1 ? "1 inconsistency"
+                      : fmt::format("{} inconsistencies", count);
+}
+
+} // namespace
+
+std::string CountInconsistencies(const std::vector<Report>& reports) {
+  std::size_t count = 0;
+  for (const Report& report : reports)
+    count += CheckReport(report).size();
+  return Counted(count);
+}
+
+std::string PrintInconsistencies(const std::vector<Report>& reports) {
   std::size_t count = 0;
   for (const Report& report : reports)
     for (const Inconsistency& inconsistency : CheckReport(report)) {
       Print(fmt::format("line {}: {}\n", inconsistency.place.line, inconsistency.text));
       ++count;
     }
-  if (count > 0)
-    throw Failure(fmt::format("{}: {} inconsistenc{}", source, count, count == 1 ? "y" : "ies"));
+  if (count == 0)
+    Print(fmt::format("{} report{}, no contradiction\n", reports.size(),
+                      reports.size() == 1 ? "" : "s"));
+  return Counted(count);
 }
 
 } // namespace VOK::MemPool::Tools

@@ -28,9 +28,12 @@ struct Inconsistency {
 /// The inconsistencies of a report by line. A report of an undamaged pool has none.
 std::vector<Inconsistency> CheckReport(const Report& report);
 
-/// Prints the inconsistencies of all reports with their lines. Fails if there are any; the source's
-/// name begins the message.
-void PrintInconsistencies(const std::vector<Report>& reports, const std::string& source);
+/// How many inconsistencies the reports have, "1 inconsistency" for one; empty for none.
+std::string CountInconsistencies(const std::vector<Report>& reports);
+
+/// Prints the inconsistencies of all reports with their lines, or that there are none. Returns what
+/// CountInconsistencies does.
+std::string PrintInconsistencies(const std::vector<Report>& reports);
 
 } // namespace VOK::MemPool::Tools
 

@@ -1,6 +1,6 @@
-#include "report/Json.h"
+#include "report/Formats.h"
 
-#include "common/Failure.h"
+#include "common/Tool.h"
 #include "report/Form.h"
 
 #include <algorithm>
@@ -185,6 +185,21 @@ void FromJson(const Json& json, Report& report) {
 
 /// Takes the reports out of a document while it is parsed, bucket by bucket, and leaves in each
 /// array what isn't one: as values of the parser a large report takes many times its own size.
+/// Where a document can't be read on.
+std::string PlaceOf(std::string_view document, std::size_t byte) {
+  const std::string_view before = document.substr(0, byte > 0 ? byte - 1 : 0);
+  const auto line = std::count(before.begin(), before.end(), '\n') + 1;
+  const std::size_t lineBegin = before.rfind('\n') + 1; // 0 if there is none
+  return fmt::format("line {}, column {}", line, before.size() - lineBegin + 1);
+}
+
+/// The key in a message of the JSON library.
+std::string LastQuoted(std::string_view message) {
+  const std::size_t end = message.rfind('\'');
+  const std::size_t begin = message.rfind('\'', end - 1) + 1;
+  return fmt::format("\"{}\"", message.substr(begin, end - begin));
+}
+
 class Collector {
 public:
   std::vector<Report> reports;
@@ -213,7 +228,7 @@ private:
 
 } // namespace
 
-std::vector<Report> ReadJson(std::string_view document) {
+ReportText ReadJson(std::string_view document) {
   Collector collector;
   try {
     const Json json =
@@ -221,10 +236,16 @@ std::vector<Report> ReadJson(std::string_view document) {
           return collector.Take(depth, event, parsed);
         });
     if (!json.at("reports").empty()) Refuse("reports", "an array of objects");
-  } catch (const Json::exception& error) {
-    throw Failure(fmt::format("not a document of reports: {}", error.what()));
+  } catch (const Json::parse_error& error) {
+    return {{}, "not a JSON document: " + PlaceOf(document, error.byte)};
+  } catch (const Json::out_of_range& error) {
+    return {{}, "not a document of reports: it lacks " + LastQuoted(error.what())};
+  } catch (const Json::exception&) {
+    return {{}, "not a document of reports: a value has another type than in one of --json"};
+  } catch (const Failure& failure) {
+    return {{}, failure.what()};
   }
-  return std::move(collector.reports);
+  return {std::move(collector.reports), ""};
 }
 
 } // namespace VOK::MemPool::Tools

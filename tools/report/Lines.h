@@ -3,6 +3,7 @@
 #ifndef VOK_MEMPOOL_TOOLS_REPORT_LINES_H
 #define VOK_MEMPOOL_TOOLS_REPORT_LINES_H
 
+#include "common/Tool.h"
 #include "report/Model.h"
 
 #include <cstddef>
@@ -11,10 +12,18 @@
 
 namespace VOK::MemPool::Tools {
 
+/// A line that isn't what a report has there.
+struct LineFailure : Failure {
+  LineFailure(std::size_t line_, const std::string& text) : Failure(text), line(line_) {}
+
+  std::size_t line;
+};
+
 /// The lines of a text, of which the last may lack its end.
 class Lines {
 public:
-  bool isCrLf = false; ///< lines end as on Windows, and are returned without them
+  bool isCrLf = false;    ///< lines end as on Windows, and are returned without them
+  bool isLenient = false; ///< a line may lack the blanks at its end
 
   explicit Lines(std::string_view text_) : text(text_) {}
 
@@ -33,6 +42,9 @@ public:
 
   /// Fails unless there is a present line, with its line end.
   void CheckWhole(std::string_view expected) const;
+
+  /// Whether what is left of the present line is this text, as far as it must be.
+  bool IsLast(std::string_view rest, std::string_view expected) const;
 
   [[noreturn]] void Fail(std::string_view expected, std::size_t column = 0) const;
 

@@ -1,9 +1,7 @@
 #include "report/Reader.h"
 
-#include "common/Failure.h"
-#include "common/Files.h"
 #include "report/Form.h"
-#include "report/Json.h"
+#include "report/Formats.h"
 #include "report/Lines.h"
 
 #include <algorithm>
@@ -92,7 +90,9 @@ std::size_t TakePieces(Lines& lines, std::string (*form)(std::size_t)) {
   constexpr std::size_t piece = 10;
   lines.CheckWhole("a line of the record map");
   const std::size_t size = std::max(lines.Get().size(), margin);
-  const std::size_t count = std::min((size - margin) / piece, Map::boxesPerRow);
+  const std::size_t blanks =
+      lines.isLenient ? piece - 1 : 0; // of the last piece, as far as it goes
+  const std::size_t count = std::min((size + blanks - margin) / piece, Map::boxesPerRow);
   lines.SkipExactly(form(count));
   return count;
 }
@@ -173,20 +173,17 @@ void ReadGrid(Lines& lines, Map& map) {
 
 class Reader {
 public:
-  explicit Reader(std::string_view text) : lines(text) {}
+  explicit Reader(Lines& lines_) : lines(lines_) {}
 
-  std::vector<Report> ReadAll() {
-    std::vector<Report> reports;
-    while (!lines.AtEnd()) {
-      const std::size_t title = FindTitle();
-      if (title == std::string_view::npos) {
-        lines.Skip();
-        continue;
+  std::optional<Report> ReadNext(std::size_t& title) {
+    for (; !lines.AtEnd(); lines.Skip())
+      if (const std::size_t column = FindTitle(); column != std::string_view::npos) {
+        title = lines.GetNumber();
+        Report report;
+        ReadReport(column, report);
+        return report;
       }
-      reports.emplace_back();
-      ReadReport(title, reports.back());
-    }
-    return reports;
+    return std::nullopt;
   }
 
 private:
@@ -201,6 +198,7 @@ private:
     if (title == 0) return 0;
     if (title != std::string_view::npos && lines.GetSecond().starts_with(VersionStart()))
       return title;
+    if (lines.isLenient) return std::string_view::npos;
     for (const char* const start : {PoolLabel::version, PoolTitle::buckets, PoolTitle::freeBuckets,
                                     PoolTitle::extRecs, BucketTitle::bucket})
       if (lines.StartsWith(fmt::format("{}{}", headerIndent, start)))
@@ -208,14 +206,15 @@ private:
     return std::string_view::npos;
   }
 
-  /// A name may hold line ends, so it reaches to the next line of the block.
+  /// A name may hold line ends, so it reaches to the next line of the block; but to a lenient
+  /// reading a line in between is another's.
   void ReadName(std::size_t title, Report& report) {
     report.line = lines.GetNumber();
     report.name = lines.Get().substr(title + std::string_view(PoolTitle::pool).size());
     lines.Skip();
     const Lines afterTitle = lines;
     while (!lines.StartsWith(VersionStart())) {
-      if (lines.AtEnd() || lines.StartsWith(PoolTitle::pool))
+      if (lines.AtEnd() || lines.StartsWith(PoolTitle::pool) || lines.isLenient)
         afterTitle.Fail(fmt::format("\"{}\"", VersionStart()));
       report.name += fmt::format("\n{}", lines.Get());
       lines.Skip();
@@ -248,14 +247,23 @@ private:
     lines.SkipExactly("");
     ReadTable(fmt::format("{}{}", titleIndent, PoolTitle::extRecs), report.extRecs);
     lines.SkipExactly("");
-    const std::string mark = fmt::format("{}{}", titleIndent, BucketTitle::bucket);
-    while (lines.Get().empty() && lines.GetSecond().starts_with(mark)) {
+    while (IsBucketNext()) {
       report.bucketReports.emplace_back();
       ReadBucket(report.bucketReports.back());
     }
     CheckAllBuckets(report);
     NumberLines(report);
     lines.isCrLf = false;
+  }
+
+  /// After an empty line; to a lenient reading after few lines of others, too.
+  bool IsBucketNext() const {
+    const std::string mark = fmt::format("{}{}", titleIndent, BucketTitle::bucket);
+    if (!lines.isLenient) return lines.Get().empty() && lines.GetSecond().starts_with(mark);
+    Lines next = lines;
+    for (int most = 10; most > 0 && !next.StartsWith(PoolTitle::pool); --most, next.Skip())
+      if (next.StartsWith(mark)) return true;
+    return false;
   }
 
   /// The detailed form has a report of each bucket, so a smaller number is a cut.
@@ -337,22 +345,26 @@ private:
     lines.Skip();
   }
 
-  Lines lines;
+  Lines& lines;
 };
 
 } // namespace
 
-std::vector<Report> ReadReports(std::string_view text) { return Reader(text).ReadAll(); }
+std::optional<Report> TakeReport(Lines& lines, std::size_t& title) {
+  return Reader(lines).ReadNext(title);
+}
 
-std::vector<Report> ReadReportFile(const std::string& file, bool isJson) {
-  const std::string text = Input(file).ReadAll();
+ReportText ReadReports(std::string_view text) {
+  ReportText result;
+  Lines lines(text);
+  std::size_t title = 0;
   try {
-    std::vector<Report> reports = isJson ? ReadJson(text) : ReadReports(text);
-    if (reports.empty()) throw Failure("there is no report in it");
-    return reports;
-  } catch (const Failure& failure) {
-    throw Failure(fmt::format("{}: {}", file, failure.what()));
+    while (std::optional<Report> report = TakeReport(lines, title))
+      result.reports.push_back(std::move(*report));
+  } catch (const LineFailure& failure) {
+    result.cut = fmt::format("line {}: {}", failure.line, failure.what());
   }
+  return result;
 }
 
 } // namespace VOK::MemPool::Tools

@@ -1,4 +1,4 @@
-#include "report/Writer.h"
+#include "report/Formats.h"
 
 #include "report/Form.h"
 

@@ -1,8 +1,7 @@
 // vokmempool trace: reads the trace lines in a program's output and shows what they add up to.
 // Test: tests/tools/tools_test.py.
-#include "common/Commands.h"
-#include "common/Failure.h"
 #include "common/Files.h"
+#include "common/Tool.h"
 #include "trace/History.h"
 #include "trace/Replay.h"
 #include "trace/Summary.h"
@@ -39,6 +38,19 @@ PoolNames NamesOf(const Options& options) {
     names[addr] = text.substr(middle + 1);
   }
   return names;
+}
+
+/// Refuses anything else, and says what the number is of.
+CLI::Validator NumberFrom(std::uint64_t least, std::uint64_t most, const char* what) {
+  const auto check = [=](const std::string& text) {
+    std::uint64_t number = 0;
+    const char* const end = text.data() + text.size();
+    const auto result = std::from_chars(text.data(), end, number);
+    if (result.ec == std::errc() && result.ptr == end && number >= least && number <= most)
+      return std::string();
+    return fmt::format("takes {}, from {} to {}, and not {}", what, least, most, text);
+  };
+  return {check, ""};
 }
 
 void ApplySettings(const Options& options) {
@@ -98,8 +110,8 @@ void ShowPoolsAt(const Options& options) {
         replay.Take(event, verdict);
       });
   if (numLines < options.at)
-    throw Failure(
-        fmt::format("{}: it has no line {}, only {}", options.file, options.at, numLines));
+    throw Failure(fmt::format("{}: it has no line {}, only {}", NameOfFile(options.file),
+                              options.at, numLines));
   WarnOf(ledger, names);
   replay.Print(options.detailed);
 }
@@ -124,7 +136,7 @@ void Run(const Options& options) {
         history.Sample(line, ledger);
       });
   if (ledger.numEvents == 0 && ledger.mixed.count == 0)
-    throw Failure(fmt::format("{}: there is no trace line in it", options.file));
+    throw Failure(fmt::format("{}: there is no trace line in it", NameOfFile(options.file)));
   WriteMassif(options, history.GetSnapshots(numLines, ledger), ledger, names);
   if (options.json)
     WriteTraceJson(ledger, numLines, names, Print);
@@ -145,20 +157,23 @@ void AddTrace(CLI::App& app) {
       ->multi_option_policy(CLI::MultiOptionPolicy::TakeAll);
   CLI::Option* const at =
       command->add_option("--at", options->at, "rebuild the pools as of this line, and report them")
-          ->check(CLI::Range(std::uint64_t{1}, UINT64_MAX));
+          ->check(NumberFrom(1, UINT64_MAX, "the number of a line"));
   command->add_flag("--json", options->json, "a JSON document")->excludes(at);
   command->add_option("--massif", options->massif, "also write a file for ms_print")->excludes(at);
   command
       ->add_option("--massif-pools", options->massifPools,
                    "also write a file for each pool: this name with .1, .2 and so on")
       ->excludes(at);
-  const auto setting = [&](CLI::Option* option) { option->needs(at)->group("With --at"); };
+  const auto setting = [&](CLI::Option* option) { return option->needs(at)->group("With --at"); };
+  const auto size = [&](const char* name, std::optional<unsigned>& value, const char* text) {
+    setting(command->add_option(name, value, text))->check(NumberFrom(0, UINT32_MAX, "bytes"));
+  };
   setting(command->add_flag("--detailed", options->detailed, "each bucket with its records"));
   setting(command->add_flag("--off", options->off, "the program's pooling was off"));
-  setting(command->add_option("--bucket-size", options->bucketSize, "the program's setting"));
-  setting(command->add_option("--data-alignment", options->dataAlignment, "likewise"));
-  setting(command->add_option("--max-record-size", options->maxRecordSize, "likewise"));
-  setting(command->add_option("--min-record-size", options->minRecordSize, "likewise"));
+  size("--bucket-size", options->bucketSize, "the program's setting");
+  size("--data-alignment", options->dataAlignment, "likewise");
+  size("--max-record-size", options->maxRecordSize, "likewise");
+  size("--min-record-size", options->minRecordSize, "likewise");
   setting(command->add_flag("--keep-empty-buckets", options->keepEmptyBuckets, "likewise"));
   command->footer("Example: what is still in use, and what were the pools at line 1200?\n"
                   "  ZOR_VOK_MEMPOOL_TRACE=1 ./program > out.txt; vokmempool trace out.txt\n"

@@ -1,6 +1,6 @@
 #include "trace/Replay.h"
 
-#include "common/Failure.h"
+#include "common/Tool.h"
 
 #include <fmt/format.h>
 #include <iostream>
