@@ -92,6 +92,8 @@ detailed         25         27          3      12349804      12349032  100.0 %
      "\\x01: its first lines are not in the trace\n"
      "vokmempool: cache: a Clear lies between line 2 and line 6, the report is uncertain\n"
      "vokmempool: 2 mixed or cut lines were skipped, the first is line 10\n"),
+    ("trace --name b0=x", TRACE + "\n" + DEMO.replace("0x20000000", "0xa0"), 0,
+     "*\n  demo: construction line 1*destruction line 7: x:*at 3000 of x, destruction line 7\n*", ""),
     ("trace --at 12", TRACE, 1, "", "standard input: it has no line 12, only 11\n"),
     ("report --text > /dev/full", DEMO, 1, "", "standard output: can't be written*"),
     ("report --text | head -1", DEMO * 400, 0, "MemPool::Mgr demo\n", ""),
@@ -298,7 +300,7 @@ def lines_at_random(draw, steps, wild):
 
 def literal(lines):
     """The bytes after each event, and what --json says of the lines, by walks over plain lists."""
-    pools, live, refused, course, at = {}, {}, [], [0], [None]
+    pools, live, left, refused, course, at = {}, {}, [], [], [0], [None]
     sizes, lifetimes, numbers = Counter(), Counter(), Counter()
     for number, line in enumerate(lines, 1):
         if line in MIXED + OTHER:
@@ -308,6 +310,8 @@ def literal(lines):
         if letter == "d" or letter == "c" and addr in pools:
             numbers["gone"] += 1
             pools.pop(addr, None)
+            left += [{**record, "gone": number if letter == "d" else None}
+                     for record in live.values() if record["pool"] == addr]
             live = {data: record for data, record in live.items() if record["pool"] != addr}
         numbers["made"] += letter == "c"
         if letter != "d":
@@ -353,6 +357,7 @@ def literal(lines):
         **{key: numbers[key] for key in ("made", "gone", "clears")}, "events": len(course) - 1,
         "bytes": course[-1], "peakBytes": max(course), "peakLine": at[course.index(max(course))],
         "mixed": len(mixed), "mixedLines": mixed[:100], "live": list(live.values()),
+        "numLeft": len(left), "left": left[:100],
         "refused": len(refused), "refusedFrees": refused[:100],
         "sizes": [{"size": size, "requests": sizes[size]} for size in sorted(sizes)],
         "lifetimes": [{"from": least, "records": lifetimes[least]} for least in sorted(lifetimes)],

@@ -62,13 +62,39 @@ void ApplySettings(const Options& options) {
   if (options.keepEmptyBuckets) ZOR_VOK_MEMPOOL_KEEP_EMPTY_BUCKETS(true);
 }
 
-/// Reads all lines, or those up to `last` if that isn't 0; `take` gets each event with its line and
-/// what the ledger finds. Returns the number of lines.
+/// Takes the names of pools from the reports between the trace lines, whose pools have the same
+/// addresses. A name that the user gives stays.
+class NameFinder {
+public:
+  explicit NameFinder(PoolNames& names_) : names(names_) {}
+
+  void Take(std::string_view line) {
+    constexpr std::string_view title = "MemPool::Mgr ";
+    constexpr std::string_view address = "   Addr        : 0x";
+    if (line.starts_with(title)) {
+      name = line.substr(title.size());
+      linesLeft = 3; // the version's line precedes that of the address
+    } else if (linesLeft > 0 && line.starts_with(address)) {
+      std::uint64_t addr = 0;
+      std::from_chars(line.data() + address.size(), line.data() + line.size(), addr, 16);
+      names.try_emplace(addr, name);
+    }
+    if (linesLeft > 0) --linesLeft;
+  }
+
+private:
+  PoolNames& names;
+  std::string name;
+  int linesLeft = 0;
+};
+
+/// Reads all lines, or those up to the one to report; `take` gets each event with its line and what
+/// the ledger finds. Returns the number of lines.
 template <class Take>
-std::uint64_t ReadTrace(const Options& options, TraceLedger& ledger, std::uint64_t last,
-                        Take take) {
+std::uint64_t ReadTrace(const Options& options, TraceLedger& ledger, PoolNames& names, Take take) {
   Input input(options.file);
   Progress progress(input.GetSize());
+  NameFinder finder(names);
   std::uint64_t number = 0;
   ForEachLine(input, progress, [&](std::string_view line, bool isWhole) {
     ++number;
@@ -78,7 +104,9 @@ std::uint64_t ReadTrace(const Options& options, TraceLedger& ledger, std::uint64
       take(number, event, ledger.Take(number, event));
     else if (kind != LineKind::Other)
       ledger.TakeMixed(number, line);
-    return number != last;
+    else
+      finder.Take(line);
+    return number != options.at;
   });
   return number;
 }
@@ -101,12 +129,12 @@ void WarnOf(const TraceLedger& ledger, const PoolNames& names) {
 }
 
 void ShowPoolsAt(const Options& options) {
-  const PoolNames names = NamesOf(options);
+  PoolNames names = NamesOf(options);
   ApplySettings(options);
   TraceLedger ledger;
   Replay replay(names);
   const std::uint64_t numLines = ReadTrace(
-      options, ledger, options.at, [&](LineNumber, const TraceEvent& event, const auto& verdict) {
+      options, ledger, names, [&](LineNumber, const TraceEvent& event, const auto& verdict) {
         replay.Take(event, verdict);
       });
   if (numLines < options.at)
@@ -128,11 +156,11 @@ void WriteMassif(const Options& options, const std::vector<History::Snapshot>& s
 
 void Run(const Options& options) {
   if (options.at != 0) return ShowPoolsAt(options);
-  const PoolNames names = NamesOf(options);
+  PoolNames names = NamesOf(options);
   TraceLedger ledger;
   History history;
   const std::uint64_t numLines =
-      ReadTrace(options, ledger, 0, [&](LineNumber line, const TraceEvent&, const auto&) {
+      ReadTrace(options, ledger, names, [&](LineNumber line, const TraceEvent&, const auto&) {
         history.Sample(line, ledger);
       });
   if (ledger.numEvents == 0 && ledger.mixed.count == 0)

@@ -56,6 +56,7 @@ void WriteTraceJson(const TraceLedger& ledger, std::uint64_t numLines, const Poo
                              {"gone", ledger.gone.count},
                              {"clears", ledger.numClears},
                              {"refused", ledger.refused.count},
+                             {"numLeft", ledger.left.count},
                              {"mixed", ledger.mixed.count},
                              {"bytes", ledger.bytes},
                              {"peakBytes", ledger.peakBytes},
@@ -68,14 +69,20 @@ void WriteTraceJson(const TraceLedger& ledger, std::uint64_t numLines, const Poo
   WriteArray(
       "gonePools", ledger.gone.items, [&](const TracedPool& pool) { return PoolJson(pool, names); },
       write);
+  const auto liveJson = [](const TraceLedger::Live& record) {
+    return Json{{"line", record.line},
+                {"pool", BareAddress(record.pool)},
+                {"data", BareAddress(record.data)},
+                {"size", record.size},
+                {"uncertain", record.isUncertain}};
+  };
+  WriteArray("live", ledger.GetLiveRecords(), liveJson, write);
   WriteArray(
-      "live", ledger.GetLiveRecords(),
-      [](const TraceLedger::Live& record) {
-        return Json{{"line", record.line},
-                    {"pool", BareAddress(record.pool)},
-                    {"data", BareAddress(record.data)},
-                    {"size", record.size},
-                    {"uncertain", record.isUncertain}};
+      "left", ledger.left.items,
+      [&](const TraceLedger::Live& record) {
+        Json json = liveJson(record);
+        json["gone"] = LineJson(record.gone);
+        return json;
       },
       write);
   WriteArray(

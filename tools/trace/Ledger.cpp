@@ -59,11 +59,31 @@ void TraceLedger::End(std::uint64_t addr, LineNumber line) {
   pool.gone = line;
   bytes -= pool.bytes;
   numStale += pool.records + pool.uncertainRecords;
+  KeepLeft(found->second);
   gone.Add(pool);
   addrByKey.erase(found->second.key);
   livePools.erase(found);
   recent = nullptr;
   if (numStale > 1000 && numStale > live.GetSize() / 2) DropStale();
+}
+
+/// Only the first ones are looked for in the table.
+void TraceLedger::KeepLeft(const LivePool& at) {
+  const std::uint64_t count = at.pool.records + at.pool.uncertainRecords;
+  if (count > 0 && left.items.size() < left.most) {
+    std::vector<Live> records;
+    for (const LiveRecord& record : live.GetPlaces())
+      if (record.line != 0 && record.pool == at.key) records.push_back(LiveOf(record, at.pool));
+    std::ranges::sort(records, {}, &Live::line);
+    records.resize(std::min(records.size(), left.most - left.items.size()));
+    left.items.insert(left.items.end(), records.begin(), records.end());
+  }
+  left.count += count;
+}
+
+TraceLedger::Live TraceLedger::LiveOf(const LiveRecord& record, const TracedPool& pool) {
+  return {record.data, pool.addr, record.line, record.size, record.line < pool.clearBefore,
+          pool.gone};
 }
 
 void TraceLedger::Alloc(LivePool& at, LineNumber line, const TraceEvent& event, Verdict& verdict) {
@@ -174,9 +194,7 @@ std::vector<TraceLedger::Live> TraceLedger::GetLiveRecords() const {
   for (const LiveRecord& record : live.GetPlaces()) {
     const auto owner = addrByKey.find(record.pool);
     if (record.line == 0 || owner == addrByKey.end()) continue;
-    const TracedPool& pool = livePools.at(owner->second).pool;
-    records.push_back(
-        {record.data, pool.addr, record.line, record.size, record.line < pool.clearBefore});
+    records.push_back(LiveOf(record, livePools.at(owner->second).pool));
   }
   std::sort(records.begin(), records.end(),
             [](const Live& a, const Live& b) { return a.line < b.line; });

@@ -72,6 +72,7 @@ public:
     LineNumber line;
     std::uint32_t size;
     bool isUncertain;
+    LineNumber gone = 0; ///< of its pool; 0 while that is live
   };
 
   enum class Outcome {
@@ -86,6 +87,7 @@ public:
   };
 
   Kept<TracedPool> gone;
+  Kept<Live> left; ///< in pools that are gone, pool by pool
   std::map<std::uint32_t, std::uint64_t> requestsBySize;
   std::array<std::uint64_t, 64> lifetimes{}; ///< by the logarithm of the events from a to f
   Kept<RefusedFree> refused;
@@ -116,6 +118,8 @@ private:
   LivePool& Find(std::uint64_t addr);
   LivePool& Begin(std::uint64_t addr, LineNumber line);
   void End(std::uint64_t addr, LineNumber line);
+  void KeepLeft(const LivePool& at);
+  static Live LiveOf(const LiveRecord& record, const TracedPool& pool);
   void Alloc(LivePool& at, LineNumber line, const TraceEvent& event, Verdict& verdict);
   void Free(LivePool& at, LineNumber line, const TraceEvent& event, Verdict& verdict);
   TracedPool* OwnerOf(const LiveRecord& record);

@@ -90,11 +90,17 @@ std::string SummariseTrace(const TraceLedger& ledger, std::uint64_t numLines,
       Section("destroyed pools", ledger.gone.items, ledger.gone.count, [&](const TracedPool& pool) {
         return fmt::format("destruction {}: {}", LineText(pool.gone), PoolText(pool, names));
       });
-  text += Section("live records at the end", live, live.size(), [&](const auto& record) {
+  const auto recordText = [&](const TraceLedger::Live& record) {
     return fmt::format("line {}: {} bytes at {} of {}{}", record.line, record.size,
                        BareAddress(record.data), NameOf(names, record.pool),
                        record.isUncertain ? ", uncertain: a Clear follows it" : "");
-  });
+  };
+  text += Section("live records at the end", live, live.size(), recordText);
+  text +=
+      Section("records left in destroyed pools", ledger.left.items, ledger.left.count,
+              [&](const TraceLedger::Live& record) {
+                return fmt::format("{}, destruction {}", recordText(record), LineText(record.gone));
+              });
   text += Sizes(ledger) + Lifetimes(ledger);
   text +=
       Section("freed pointers that were not live in their pool", ledger.refused.items,
