@@ -109,6 +109,17 @@ def test_moving():
     same((child.process.returncode, " damaged" in found, " moving\n" in found), (0, False, True), found)
 
 
+def test_every():
+    """Round after round, until the process ends."""
+    child = Child("set on=1;pool a;alloc 9;stop")
+    os.waitpid(child.process.pid, os.WUNTRACED)
+    watcher = subprocess.Popen([PROGRAM, "inspect", "--every", ".02", str(child.process.pid)],
+                               stdout=subprocess.PIPE, text=True)
+    rounds = [watcher.stdout.readline().split()[0] for _ in range(6)]
+    child.process.kill()
+    same((rounds, watcher.wait()), (["pool", "a"] * 3, 0), "rounds")
+
+
 class Core:
     """The pieces of a core file's memory that the pools are in."""
 
@@ -221,6 +232,7 @@ def test_commands():
     for arguments, status, message in [
             ("", 2, "PID|CORE is required\nusage: *"), ("1 2", 2, "*"),
             ("--stop taken", 2, "--stop: only a process can be stopped\nusage: *"),
+            ("--every 1 taken", 2, "--every: only a process changes\nusage: *"),
             ("/no/such", 1, "/no/such: can't be opened: No such file or directory\n"),
             ("compressed", 1, "compressed: it is compressed; decompress it first\n"),
             (PROGRAM, 1, f"{PROGRAM}: it is no core file\n"), ("/", 1, "/: it is no core file\n"),
@@ -248,6 +260,7 @@ def main():
         test_damages(50 if EMULATOR else 500)
         if not EMULATOR:
             test_moving()
+            test_every()
             test_commands()
 
 

@@ -43,7 +43,7 @@ COMMANDS = [
     *((f"{name} --help", "", 0, "*Example: *", "") for name in ("report", "picture", "trace", "chart")),
     ("--version", "", 0, "vokmempool 1.*", ""),
     ("reprot", "", 2, "", "there is no subcommand reprot, the nearest is report" + USAGE),
-    ("report --json --check", "", 2, "", "*[--summary,--json,--check,--text]" + USAGE),
+    ("report --json --check", "", 2, "", "*[--summary,--json,--check,--text,*]" + USAGE),
     ("report /no/such", "", 1, "", "/no/such: can't be opened: No such file or directory\n"),
     ("report /", "", 1, "", "/: can't be read: Is a directory\n"),
     ("report", "MemPool::Mgr a\n" + 60 * "x", 1, "",
@@ -273,6 +273,42 @@ def test_library():
         same(certain - used, set(), f"the live records of seed {seed}")
 
 
+def records_of(report):
+    """The size of each used record by address."""
+    rows = {int(row["addr"], 16) + 4: row["dataSize"] for bucket in report["bucketReports"]
+            for row in bucket["records"]["rows"] if row["type"] == "USED"}
+    return rows | {int(row["data"], 16): row["length"] for row in report["extRecs"]["rows"]}
+
+
+def test_growth():
+    """What changed between two reports of a pool, the rows of both, and the figures of the last."""
+    half, end = Work(11, 1500, names=("a \"b\"\\", "gone")).reports
+    Path("half").write_text(half)
+    was, now = (next(report for report in data_of(text) if report["name"] != "gone")
+                for text in (half, end))
+    ours = re.search("(?s)^MemPool::Mgr a.*?(?=^MemPool::Mgr gone|\\Z)", end, re.M)[0]
+    diff = tool("report", "--diff", "half", "--records", given=ours).splitlines()
+    same([line.split()[0] for line in diff if line[0] != " "], ["a", "gone"], "the pools that differ")
+    same("gone went: used -" in "\n".join(diff), True, "a pool that went")
+    mine = diff[:diff.index(next(line for line in diff if line.startswith("gone")))]
+    first, later = records_of(was), records_of(now)
+    same(sorted(line for line in mine if re.match("  (came|went): ", line)),
+         sorted([f"  came: {size} bytes at {at:#x}" for at, size in later.items() - first.items()] +
+                [f"  went: {size} bytes at {at:#x}" for at, size in first.items() - later.items()]),
+         "the records")
+    same(f"used {len(later) - len(first):+}" in mine[0] or len(later) == len(first), True, mine[0])
+    same(tool("report", "--diff", "half", given=half), "", "no difference")
+    series = [line.split(",") for line in tool("report", "--series", given=half + ours).splitlines()]
+    same([row[2:6] for row in series[1:] if row[1].startswith('"a')],
+         [[str(report["header"][key]) for key in ("usedRecs", "freeRecs", "extRecs", "numBuckets")]
+          for report in (was, now)], "the rows of a pool")
+    metrics = tool("report", "--prometheus", given=half + ours)
+    same(re.findall(r'^vokmempool_used_records\{pool="a \\"b\\"\\\\"\} (.*)', metrics, re.M),
+         [str(now["header"]["usedRecs"])], "the metric of the last report")
+    grammar = r'(# (HELP|TYPE) vokmempool_\w+ .*\n|vokmempool_\w+\{pool="([^"\\\n]|\\["\\n])*"\} \d+\n)*'
+    same(re.fullmatch(grammar, metrics) is not None, True, metrics)
+
+
 EVENTS = ("zvpt:c:5581c0de", "zvpt:d:003a1f40\r", "zvpt:a:1:ffffffffffffffff:1073741823",
           "zvpt:a:1:2:0", "zvpt:f:1:2:")
 MIXED = ("zvpt:a:1:2:1073741824", "zvpt:a:1:2:007", "zvpt:a:1:2:1,000", "zvpt:a:1:2:",
@@ -390,4 +426,5 @@ with tempfile.TemporaryDirectory() as folder:
     test_changes()
     test_lenient()
     test_library()
+    test_growth()
     test_trace()

@@ -10,9 +10,13 @@
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <charconv>
+#include <chrono>
+#include <cstdio>
 #include <fmt/format.h>
+#include <fstream>
 #include <memory>
 #include <optional>
+#include <thread>
 
 namespace VOK::MemPool::Tools {
 
@@ -20,7 +24,8 @@ namespace {
 
 struct Options {
   std::string source;
-  bool stop = false, json = false, summary = false, check = false, text = false;
+  bool stop = false, json = false, summary = false, check = false, text = false, prometheus = false;
+  double every = 0; ///< seconds between two rounds
 
   bool NeedsRecords() const { return json || check || text; }
 
@@ -61,9 +66,7 @@ std::string MarkOf(const Pool& pool) {
   return pool.isMoving ? " moving" : pool.IsDamaged() ? " damaged" : "";
 }
 
-void Run(const Options& options) {
-  if (options.stop && !options.GetProcess())
-    throw CLI::ValidationError("--stop", "only a process can be stopped");
+void Show(const Options& options) {
   Pools pools = Read(options);
   const std::vector<std::string> damages = DamagesOf(pools);
   const auto numMoving = std::ranges::count(pools.all, true, &Pool::isMoving);
@@ -79,6 +82,8 @@ void Run(const Options& options) {
   }
   if (options.json)
     WriteJson(reports, Print);
+  else if (options.prometheus)
+    Print(PrometheusText(reports));
   else if (options.text)
     for (const Report& report : reports)
       Print(WriteReport(report));
@@ -94,6 +99,28 @@ void Run(const Options& options) {
                               damages.size() == 1 ? "" : "s", damages.front()));
 }
 
+/// A process that has ended has no memory, also while its parent hasn't asked for its status.
+bool HasMemory(const std::string& process) {
+  return std::ifstream("/proc/" + process + "/maps").peek() != std::ifstream::traits_type::eof();
+}
+
+/// Until the process ends.
+void ShowAgainAndAgain(const Options& options) {
+  do {
+    Show(options);
+    std::fflush(stdout);
+    std::this_thread::sleep_for(std::chrono::duration<double>(options.every));
+  } while (HasMemory(options.source));
+}
+
+void Run(const Options& options) {
+  if (options.stop && !options.GetProcess())
+    throw CLI::ValidationError("--stop", "only a process can be stopped");
+  if (options.every > 0 && !options.GetProcess())
+    throw CLI::ValidationError("--every", "only a process changes");
+  options.every > 0 ? ShowAgainAndAgain(options) : Show(options);
+}
+
 } // namespace
 
 void AddInspect(CLI::App& app) {
@@ -102,14 +129,18 @@ void AddInspect(CLI::App& app) {
       app.add_subcommand("inspect", "Shows the pools of a running process or of a core file");
   command->add_option("PID|CORE", options->source, "the process, or the core file")->required();
   command->add_flag("--stop", options->stop, "stop the process while it is read");
+  command->add_option("--every", options->every, "seconds until the process is read again")
+      ->check(CLI::Range(0.01, 86400.0));
   CLI::Option_group* const form = command->add_option_group("Form");
   form->add_flag("--summary", options->summary, "a table of the pools (if no other form is named)");
   form->add_flag("--json", options->json, "a JSON document of all that DbgDetailed would print");
   form->add_flag("--check", options->check, "each damage, and each inconsistency with its line");
   form->add_flag("--text", options->text, "what DbgDetailed would print");
+  form->add_flag("--prometheus", options->prometheus, "the figures of each pool as metrics");
   form->require_option(0, 1);
   command->footer("Example: which pool holds the memory of this process?\n"
-                  "  vokmempool inspect $(pidof program)");
+                  "  vokmempool inspect $(pidof program)\n"
+                  "  vokmempool inspect --text --every 5 $(pidof program) > growth.txt");
   command->callback([options] { Run(*options); });
 }
 

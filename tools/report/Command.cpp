@@ -3,6 +3,7 @@
 #include "common/Files.h"
 #include "common/Tool.h"
 #include "report/Check.h"
+#include "report/Difference.h"
 #include "report/Formats.h"
 #include "report/Summary.h"
 
@@ -15,19 +16,27 @@ namespace VOK::MemPool::Tools {
 namespace {
 
 struct Options {
-  std::string file = "-";
-  bool json = false, summary = false, check = false, text = false, fromJson = false,
-       lenient = false;
+  std::string file = "-", before;
+  bool json = false, summary = false, check = false, text = false, prometheus = false,
+       series = false, fromJson = false, lenient = false, records = false;
 };
 
-ReportText Read(const std::string& text, const Options& options) {
+ReportText Read(const std::string& file, const Options& options) {
+  const std::string text = Input(file).ReadAll();
   if (options.fromJson) return ReadJson(text);
   if (!options.lenient) return ReadReports(text);
   PassedOver passed;
   ReportText result = ReadReportsLeniently(text, passed);
   if (const std::string said = passed.Say(); !said.empty())
-    fmt::print(stderr, "vokmempool: {}: {}\n", NameOfFile(options.file), said);
+    fmt::print(stderr, "vokmempool: {}: {}\n", NameOfFile(file), said);
   return result;
+}
+
+std::string DifferenceSince(const std::vector<Report>& now, const Options& options) {
+  const ReportText before = Read(options.before, options);
+  if (!before.cut.empty())
+    throw Failure(fmt::format("{}: {}", NameOfFile(options.before), before.cut));
+  return Difference(before.reports, now, options.records);
 }
 
 /// What ends the command, empty if all is well.
@@ -35,6 +44,12 @@ std::string Show(const std::vector<Report>& reports, const Options& options) {
   if (options.check) return PrintInconsistencies(reports);
   if (options.json)
     WriteJson(reports, Print);
+  else if (!options.before.empty())
+    Print(DifferenceSince(reports, options));
+  else if (options.prometheus)
+    Print(PrometheusText(reports));
+  else if (options.series)
+    Print(SeriesText(reports));
   else if (options.text)
     for (const Report& report : reports)
       Print(WriteReport(report));
@@ -48,8 +63,7 @@ std::string Show(const std::vector<Report>& reports, const Options& options) {
 }
 
 void Run(const Options& options) {
-  const std::string content = Input(options.file).ReadAll();
-  const ReportText text = Read(content, options);
+  const ReportText text = Read(options.file, options);
   std::string failure;
   if (!text.reports.empty())
     failure = Show(text.reports, options);
@@ -78,9 +92,16 @@ void AddReport(CLI::App& app) {
   form->add_flag("--json", options->json, "a JSON document of all that the reports say");
   form->add_flag("--check", options->check, "each inconsistency in a report, with its line");
   form->add_flag("--text", options->text, "the reports alone, as the library prints them");
+  form->add_flag("--prometheus", options->prometheus, "the last figures of each pool as metrics");
+  form->add_flag("--series", options->series, "a row for each report as CSV");
+  CLI::Option* const diff = form->add_option(
+      "--diff", options->before, "an earlier output of the same process: what has changed since");
   form->require_option(0, 1);
+  command->add_flag("--records", options->records, "with --diff: each record that came or went")
+      ->needs(diff);
   command->footer("Example: is the pool's state consistent after this run?\n"
-                  "  ./program | vokmempool report --check");
+                  "  ./program | vokmempool report --check\n"
+                  "  vokmempool report --diff before.txt after.txt");
   command->callback([options] { Run(*options); });
 }
 

@@ -4,6 +4,8 @@
 
 #include <algorithm>
 #include <fmt/format.h>
+#include <map>
+#include <string_view>
 
 namespace VOK::MemPool::Tools {
 
@@ -41,6 +43,74 @@ std::string Summarise(const std::vector<Report>& reports, const std::vector<std:
     text += fmt::format(form, OneLine(report.name), width, report.usedRecs, report.freeRecs,
                         report.numExtRecs, bytes.held, bytes.payload, share,
                         (report.IsOff() ? " off" : "") + (marks.empty() ? "" : marks[i]));
+  }
+  return text;
+}
+
+namespace {
+
+struct Metric {
+  const char* name;
+  const char* title;
+  std::uint64_t (*get)(const Report& report);
+};
+
+constexpr Metric metrics[] = {
+    {"used_records", "Used records in buckets",
+     [](const Report& r) { return std::uint64_t{r.usedRecs}; }},
+    {"free_records", "Free records in buckets",
+     [](const Report& r) { return std::uint64_t{r.freeRecs}; }},
+    {"ext_records", "Large records, blocks of their own",
+     [](const Report& r) { return std::uint64_t{r.numExtRecs}; }},
+    {"buckets", "Buckets", [](const Report& r) { return std::uint64_t{r.numBuckets}; }},
+    {"empty_buckets", "Buckets without a used record",
+     [](const Report& r) { return std::uint64_t{r.empty}; }},
+    {"full_buckets", "Buckets without a free record",
+     [](const Report& r) { return std::uint64_t{r.full}; }},
+    {"held_bytes", "Bytes of the heap in buckets and large records",
+     [](const Report& r) { return BytesOf(r).held; }},
+    {"payload_bytes", "Data bytes of used records",
+     [](const Report& r) { return BytesOf(r).payload; }},
+    {"enabled", "1 if pooling is on", [](const Report& r) { return std::uint64_t{r.enabled}; }},
+};
+
+std::string Escaped(std::string_view text, std::string_view special, std::string_view escape) {
+  std::string escaped;
+  for (const char c : text)
+    if (c == '\n' && escape == "\\")
+      escaped += "\\n";
+    else
+      escaped.append(special.find(c) == special.npos ? "" : escape) += c;
+  return escaped;
+}
+
+} // namespace
+
+std::string PrometheusText(const std::vector<Report>& reports) {
+  std::map<std::string, const Report*> last;
+  for (const Report& report : reports)
+    last[report.name] = &report;
+  std::string text;
+  for (const Metric& metric : metrics) {
+    text += fmt::format("# HELP vokmempool_{0} {1}\n# TYPE vokmempool_{0} gauge\n", metric.name,
+                        metric.title);
+    for (const auto& [name, report] : last)
+      text += fmt::format("vokmempool_{}{{pool=\"{}\"}} {}\n", metric.name,
+                          Escaped(name, "\\\"", "\\"), metric.get(*report));
+  }
+  return text;
+}
+
+std::string SeriesText(const std::vector<Report>& reports) {
+  std::string text = "line,pool";
+  for (const Metric& metric : metrics)
+    text += fmt::format(",{}", metric.name);
+  text += '\n';
+  for (const Report& report : reports) {
+    text += fmt::format("{},\"{}\"", report.line, Escaped(report.name, "\"", "\""));
+    for (const Metric& metric : metrics)
+      text += fmt::format(",{}", metric.get(report));
+    text += '\n';
   }
   return text;
 }

@@ -1,4 +1,5 @@
-// The pools of a text side by side: what each holds, and what of that its callers use.
+// The pools of a text side by side: what each holds, and what of that its callers use; for people,
+// for Prometheus and for a spreadsheet.
 // Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_REPORT_SUMMARY_H
 #define VOK_MEMPOOL_TOOLS_REPORT_SUMMARY_H
@@ -21,6 +22,13 @@ Bytes BytesOf(const Report& report);
 /// A table with a row for each report; `marks` ends the rows.
 std::string Summarise(const std::vector<Report>& reports,
                       const std::vector<std::string>& marks = {});
+
+/// The figures of each pool in Prometheus' text format, with its name as label. Of several reports
+/// of a name the last counts.
+std::string PrometheusText(const std::vector<Report>& reports);
+
+/// A row for each report as CSV, with its line, under a row of headings.
+std::string SeriesText(const std::vector<Report>& reports);
 
 } // namespace VOK::MemPool::Tools
 
