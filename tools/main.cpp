@@ -54,6 +54,7 @@ int Run(int argc, char** argv) {
   Tools::AddTrace(app);
   Tools::AddChart(app);
   Tools::AddInspect(app);
+  Tools::AddTop(app);
   try {
     app.parse(argc, argv);
   } catch (const CLI::Success& help) {

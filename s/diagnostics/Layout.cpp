@@ -5,6 +5,7 @@
 #include "diagnostics/ReportLayout.h"
 #include "engine/Bucket.h"
 #include "engine/BucketMgr.h"
+#include "engine/Budget.h"
 #include "engine/ExtRec.h"
 #include "engine/Group.h"
 #include "engine/Rec.h"
@@ -71,6 +72,9 @@ constexpr Structures structures{
     .limits = {.maxRequest = maxRequest,
                .minBucketSize = minBucketSize,
                .maxBucketSize = maxBucketSize},
+    .budget = {.held = offsetof(PoolBlock, budget) + offsetof(Budget, held),
+               .peak = offsetof(PoolBlock, budget) + offsetof(Budget, peak),
+               .buckets = offsetof(PoolBlock, budget) + offsetof(Budget, buckets)},
 };
 
 constexpr Layout Describe() {

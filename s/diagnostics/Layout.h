@@ -38,6 +38,9 @@ struct Structures {
   struct {
     std::uint32_t maxRequest, minBucketSize, maxBucketSize;
   } limits; ///< the figures of a report that no structure has
+  struct {
+    std::uint32_t held, peak, buckets;
+  } budget; ///< 8 bytes each, from the start of the BucketMgr: bytes of the heap, and buckets
 };
 
 inline constexpr char layoutMagic[24] = "VokMemPoolLayout";

@@ -163,7 +163,8 @@ void BucketMgr::Clear() noexcept {
     delete &group;
     groups[i] = nullptr;
   });
-  BudgetOf(*this).held = 0;
+  Budget& budget = BudgetOf(*this);
+  budget.held = budget.buckets = 0;
 }
 
 bool BucketMgr::Reset() noexcept {

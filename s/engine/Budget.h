@@ -21,10 +21,12 @@ namespace VOK::MemPool {
 
 struct Bucket;
 
-/// Counts the blocks of buckets and ExtRecs, with their headers.
+/// Counts the blocks of buckets and ExtRecs, with their headers. The figures are there for another
+/// process, too, which visits no bucket for them.
 struct Budget {
   std::uint64_t held = 0;                       ///< bytes
   std::uint64_t peak = 0;                       ///< the most that it ever was
+  std::uint64_t buckets = 0;                    ///< how many there are
   std::uint64_t reserved = 0;                   ///< bytes of blocks that are about to come
   std::uint64_t limit = UINT64_MAX;             ///< a request that would pass it fails
   decltype(Options::atLimit) atLimit = nullptr; ///< asked before such a request fails

@@ -40,6 +40,7 @@ VOK_NOINLINE void* Group::AllocFromNewBucket() {
   Group* const group = pool->GroupFor(size);
   b->parent = group;
   room.Fill();
+  ++budget.buckets;
   budget.newest = b.get();
   group->Link(b.release());
   return group->Alloc();
@@ -63,7 +64,9 @@ VOK_NOINLINE bool Group::ReleaseEmptied(Bucket* b) {
   }
   UnlinkAll(b);
   if (!wasFull) UnlinkFree(b);
-  BudgetOf(*owner).Remove(BlockSize());
+  Budget& budget = BudgetOf(*owner);
+  budget.Remove(BlockSize());
+  --budget.buckets;
   Bucket::Destroy(b);
   return true;
 }

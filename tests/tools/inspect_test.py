@@ -151,8 +151,8 @@ class Core:
         layout = next(begin + found.start() for begin, size, offset in self.segments
                       for found in re.finditer(b"VokMemPoolLayout\0", self.bytes[offset:offset + size])
                       if self.pointer(begin + found.start() + 32) == begin + found.start())
-        fields = struct.unpack("<49I", self.read(layout + 32 + 2 * WIDTH, 4 * 49))
-        self.add(layout, 32 + 2 * WIDTH + 4 * 49 + 64 + (WIDTH == 8) * 4, None)
+        fields = struct.unpack("<52I", self.read(layout + 32 + 2 * WIDTH, 4 * 52))
+        self.add(layout, 32 + 2 * WIDTH + 4 * 52 + 64, None)
         at = self.pointer(self.add(self.pointer(layout + 32 + WIDTH), WIDTH, None))
         while at:
             name, pool, at = (self.pointer(self.add(at, fields[3], None) + k * WIDTH) for k in range(3))

@@ -23,6 +23,7 @@ void AddPicture(CLI::App& app);
 void AddTrace(CLI::App& app);
 void AddChart(CLI::App& app);
 void AddInspect(CLI::App& app);
+void AddTop(CLI::App& app);
 
 } // namespace VOK::MemPool::Tools
 

@@ -1,14 +1,23 @@
-// vokmempool inspect where it can't be built.
+// What reads another process, where it can't be built.
 #include "common/Tool.h"
 
 #include <CLI/CLI.hpp>
+#include <fmt/format.h>
 
 namespace VOK::MemPool::Tools {
 
-void AddInspect(CLI::App& app) {
-  CLI::App* const command = app.add_subcommand("inspect", "Not in this build: Linux alone has it");
+namespace {
+
+void AddAbsent(CLI::App& app, const char* name) {
+  CLI::App* const command = app.add_subcommand(name, "Not in this build: Linux alone has it");
   command->allow_extras();
-  command->callback([] { throw Failure("inspect is not in this build: Linux alone has it"); });
+  command->callback(
+      [name] { throw Failure(fmt::format("{} is not in this build: Linux alone has it", name)); });
 }
+
+} // namespace
+
+void AddInspect(CLI::App& app) { AddAbsent(app, "inspect"); }
+void AddTop(CLI::App& app) { AddAbsent(app, "top"); }
 
 } // namespace VOK::MemPool::Tools

@@ -14,15 +14,9 @@ namespace VOK::MemPool::Tools {
 
 namespace {
 
-struct Entry {
-  std::string name;
-  std::uint64_t pool;
-  bool operator==(const Entry&) const = default;
-};
-
 /// The names of pools, each with the pool that its handle holds.
 struct Registry {
-  std::vector<Entry> entries;
+  std::vector<PoolPlace> entries;
   std::vector<std::string> damages;
   bool operator==(const Registry&) const = default;
 };
@@ -61,7 +55,7 @@ public:
       at = entry->GetPointer(fields.next);
     }
     Registry registry{entries, visits.damages};
-    for (Entry& entry : registry.entries)
+    for (PoolPlace& entry : registry.entries)
       Follow(entry);
     return registry;
   }
@@ -74,7 +68,7 @@ private:
   }
 
   /// A handle reports the pool that it holds, which an assignment may have changed.
-  void Follow(Entry& entry) const {
+  void Follow(PoolPlace& entry) const {
     const Structures& structures = library.layout.structures;
     const auto pool = library.Fetch(entry.pool, structures.bucketMgr.size);
     if (!pool) return;
@@ -82,13 +76,13 @@ private:
     if (!mgr) return;
     const std::uint64_t held = mgr->GetPointer(structures.mgr.bucketMgr);
     if (held == entry.pool) return;
-    const auto found = std::ranges::find(entries, held, &Entry::pool);
+    const auto found = std::ranges::find(entries, held, &PoolPlace::pool);
     if (found != entries.end()) entry = *found;
   }
 
   const Library& library;
   Visits visits;
-  std::vector<Entry> entries; ///< as the registry has them
+  std::vector<PoolPlace> entries; ///< as the registry has them
 };
 
 bool IsSame(const Registry& a, const Registry& b) { return a == b; }
@@ -118,7 +112,7 @@ public:
   void Run(Pools& pools) const {
     const auto [registry, isAgreed] = ReadRegistry();
     if (isAgreed) std::ranges::copy(registry.damages, std::back_inserter(pools.damages));
-    for (const Entry& entry : registry.entries) {
+    for (const PoolPlace& entry : registry.entries) {
       Pool pool = ReadPool(entry);
       if (pool.damages.empty() || !isChanging || IsThere(entry))
         pools.all.push_back(std::move(pool));
@@ -131,7 +125,7 @@ private:
     return isChanging ? ReadAgreed(read) : std::pair(read(), true);
   }
 
-  Pool ReadPool(const Entry& entry) const {
+  Pool ReadPool(const PoolPlace& entry) const {
     const auto read = [&] { return WalkPool(library, entry.pool, entry.name, detailed); };
     if (!isChanging) return read();
     auto [pool, isAgreed] = ReadAgreed(read);
@@ -140,7 +134,7 @@ private:
   }
 
   /// The process may have destroyed a pool meanwhile.
-  bool IsThere(const Entry& entry) const {
+  bool IsThere(const PoolPlace& entry) const {
     return std::ranges::count(ReadRegistry().first.entries, entry) > 0;
   }
 
@@ -149,6 +143,10 @@ private:
 };
 
 } // namespace
+
+std::vector<PoolPlace> ListPools(const Library& library) {
+  return RegistryWalk(library).Run().entries;
+}
 
 Pools ReadPools(const Memory& memory, bool detailed) {
   const std::vector<Library> libraries = FindLibraries(memory);

@@ -25,6 +25,18 @@ struct Pools {
   std::vector<std::string> damages; ///< what keeps a part of the registry from being read
 };
 
+struct Library;
+
+/// A pool's name, and where the pool is.
+struct PoolPlace {
+  std::string name;
+  std::uint64_t pool;
+  bool operator==(const PoolPlace&) const = default;
+};
+
+/// The pools of a library by ascending name, from one pass. Fails if the registry can't be read.
+std::vector<PoolPlace> ListPools(const Library& library);
+
 /// The pools of each library in the process, by ascending name. The lines of their reports are
 /// numbered as one text. `detailed` adds the report of each bucket. A Failure says that there is no
 /// library.
