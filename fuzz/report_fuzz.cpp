@@ -2,8 +2,10 @@
 // through JSON, and draws it; it refuses all others, and reads any text leniently. A text that
 // starts with a brace is read as a document.
 #include "Target.h"
+#include "chart/Series.h"
 #include "picture/Data.h"
 #include "report/Check.h"
+#include "report/Difference.h"
 #include "report/Formats.h"
 #include "report/Summary.h"
 
@@ -26,10 +28,14 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     CheckReport(reports[i]);
   }
   Summarise(reports);
+  PrometheusText(reports);
+  SeriesText(reports);
+  SeriesOf(reports);
   const PictureSource source{"fuzz", reports};
   const std::string page = FillPage({"", ""}, PictureData(&source, source));
   if (page.find('<') != std::string::npos) std::abort();
   PassedOver passed;
-  ReadReportsLeniently(input, passed);
+  const std::vector<Report> lenient = ReadReportsLeniently(input, passed).reports;
+  Difference(lenient, reports, true);
   return 0;
 }
