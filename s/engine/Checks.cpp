@@ -22,7 +22,7 @@ constexpr std::size_t maxLinesInUse = 10;
 
 bool IsFilled(const void* from, std::size_t size, std::uint8_t byte) {
   const auto* const bytes = static_cast<const std::uint8_t*>(from);
-  return size == 0 || (bytes[0] == byte && std::memcmp(bytes, bytes + 1, size - 1) == 0);
+  return bytes[0] == byte && std::memcmp(bytes, bytes + 1, size - 1) == 0;
 }
 
 /// A node that no operation on the map has, the spare one if it is there.
