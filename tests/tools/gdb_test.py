@@ -65,7 +65,7 @@ def expected_of(report):
 
 
 def test_reports(reports, *arguments):
-    places = [place for report in reports for place in expected_of(report)]
+    places = [place for report in reports for place in expected_of(report)][::11]
     output, _ = debug(*arguments, commands=[
         "mempool list", "echo @\\n", "mempool report b", "echo @\\n",
         *(f"mempool of {address}" for address, _ in places)])
