@@ -19,6 +19,7 @@ from pathlib import Path
 from support import PROGRAM, Work, data_of, run, same, tool
 
 GOLDEN = Path(sys.argv[3]).resolve()
+COMPLETION = GOLDEN.parents[1] / "tools/completion.bash"
 REPORTS = {path.stem: path.read_text() for path in (GOLDEN / "report").iterdir()}
 DEMO, DETAILED = REPORTS["demo"], REPORTS["detailed"]
 USAGE = "\nusage: vokmempool SUBCOMMAND [OPTIONS] [FILE]\n"
@@ -109,6 +110,14 @@ detailed         25         27          3      12349804      12349032  100.0 %
     ("trace < <(sleep 2.1; echo zvpt:c:a0)", "", 0, "1 lines, 1 *", ""),
 ]
 
+# The words of a command line, and those that its last one can become.
+COMPLETIONS = [
+    ("", "--help --version report picture trace chart inspect top"), ("re", "report"),
+    ("report --s", "--summary --series"), ("picture -", "--help --output"), ("trace out", ""),
+    ("report --diff before.txt --", "--help --from-json --lenient --records --summary --json --check "
+     "--text --prometheus --series --diff"),
+]
+
 
 def same_as_golden(name, text):
     path = GOLDEN / f"tools/{name}.txt"
@@ -135,6 +144,13 @@ def test_commands():
     slow = f"(sleep 2.1; echo zvpt:c:a0) | {PROGRAM} trace"
     terminal = run("script", "-qec", slow, "/dev/null")[0]
     same(is_like(terminal, "\r0 MB read\x1b[K\r\x1b[K1 lines*"), True, repr(terminal))
+
+
+def test_completion():
+    script = """. "$0"; program=$1; shift; COMP_WORDS=(vokmempool "$@"); COMP_CWORD=$#
+                _vokmempool "$program"; echo "${COMPREPLY[@]}\""""
+    for line, words in COMPLETIONS:
+        same(run("bash", "-c", script, COMPLETION, PROGRAM, *line.split(" ")), (f"{words}\n", "", 0), line)
 
 
 # What no change of one value makes: other states of a stream, the library's warnings.
@@ -436,6 +452,7 @@ def test_trace():
 with tempfile.TemporaryDirectory() as folder:
     os.chdir(folder)
     test_commands()
+    test_completion()
     test_changes()
     test_lenient()
     test_library()
