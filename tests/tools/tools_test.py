@@ -94,6 +94,9 @@ detailed         25         27          3      12349804      12349032  100.0 %
      "vokmempool: 2 mixed or cut lines were skipped, the first is line 10\n"),
     ("trace --name b0=x", TRACE + "\n" + DEMO.replace("0x20000000", "0xa0"), 0,
      "*\n  demo: construction line 1*destruction line 7: x:*at 3000 of x, destruction line 7\n*", ""),
+    ("trace", "zvpt:c:20000000\n" + DEMO + "zvpt:c:20000000\n" +
+     DEMO.replace(" demo", " \x01").replace("\n", "\r\n"), 0,
+     "*\n  \\x01: construction line 58,*\n  destruction not in the trace: demo: *, left 0 *", ""),
     ("trace --at 12", TRACE, 1, "", "standard input: it has no line 12, only 11\n"),
     ("report --text > /dev/full", DEMO, 1, "", "standard output: can't be written*"),
     ("report --text | head -1", DEMO * 400, 0, "MemPool::Mgr demo\n", ""),

@@ -36,12 +36,12 @@ Series SeriesOf(const std::vector<Report>& reports) {
 
 Series SeriesOf(const std::vector<History::Snapshot>& snapshots, const PoolNames& names) {
   Series series;
-  std::map<std::pair<std::uint64_t, LineNumber>, std::size_t> places;
+  std::map<PoolId, std::size_t> places;
   for (const History::Snapshot& snapshot : snapshots) {
     if (snapshot.pools.empty() && series.lines.empty()) continue;
     series.lines.push_back(snapshot.line);
     for (const History::PoolBytes& one : snapshot.pools)
-      SeriesOfKey(series, places, std::pair(one.addr, one.made), NameOf(names, one.addr))
+      SeriesOfKey(series, places, one.pool, NameOf(names, one.pool))
           .points.push_back({series.lines.size() - 1, std::nullopt, one.bytes});
   }
   return series;

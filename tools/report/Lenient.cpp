@@ -8,6 +8,7 @@
 #include <algorithm>
 #include <cctype>
 #include <fmt/format.h>
+#include <span>
 
 namespace VOK::MemPool::Tools {
 
@@ -16,7 +17,7 @@ namespace {
 constexpr std::size_t mostForeign = 1000; // lines in one report
 
 struct Line {
-  std::string_view text;
+  std::size_t begin;  ///< in the text as it is now
   std::size_t number; ///< in the text as it was
 };
 
@@ -44,15 +45,19 @@ private:
 
 class Text {
 public:
-  Text(std::string_view text, PassedOver& passed_) : passed(passed_) {
-    Split(text);
-    RemovePrefixes();
+  Text(std::string_view original, PassedOver& passed_) : passed(passed_) {
+    std::vector<std::string_view> parts = Split(original);
+    RemovePrefixes(parts);
+    text.reserve(original.size() + 1);
+    for (const std::string_view part : parts) {
+      lines.push_back({text.size(), lines.size() + 1});
+      text.append(part) += '\n';
+    }
   }
 
   ReportText Read() {
-    for (bool isMore = true; isMore;) {
-      const std::string text = TextFrom(at);
-      Lines own(text);
+    for (bool isMore = !lines.empty(); isMore;) {
+      Lines own(std::string_view(text).substr(lines[at].begin));
       own.isLenient = true;
       isMore = ReadFrom(own);
     }
@@ -60,46 +65,59 @@ public:
   }
 
 private:
-  void Split(std::string_view text) {
-    while (!text.empty()) {
-      const std::size_t end = std::min(text.find('\n'), text.size());
-      std::string_view line = text.substr(0, end);
-      if (line.ends_with('\r')) {
-        line.remove_suffix(1);
+  std::vector<std::string_view> Split(std::string_view rest) {
+    std::vector<std::string_view> parts;
+    while (!rest.empty()) {
+      const std::size_t end = std::min(rest.find('\n'), rest.size());
+      std::string_view part = rest.substr(0, end);
+      if (part.ends_with('\r')) {
+        part.remove_suffix(1);
         ++passed.lineEnds;
       }
-      lines.push_back({line, lines.size() + 1});
-      text.remove_prefix(std::min(end + 1, text.size()));
+      parts.push_back(part);
+      rest.remove_prefix(std::min(end + 1, rest.size()));
     }
+    return parts;
   }
 
   /// A title begins a prefix if the next line that begins likewise goes on with the report.
-  void RemovePrefixes() {
+  void RemovePrefixes(std::vector<std::string_view>& parts) {
     Prefix prefix;
-    for (std::size_t i = 0; i < lines.size(); ++i) {
-      std::string_view& line = lines[i].text;
-      if (const std::size_t title = line.find(PoolTitle::pool); title != line.npos) {
-        const Prefix own(line.substr(0, title));
-        prefix = IsPrefix(own, i) ? own : Prefix();
+    for (std::size_t i = 0; i < parts.size(); ++i) {
+      if (const std::size_t title = parts[i].find(PoolTitle::pool); title != parts[i].npos) {
+        const Prefix own(parts[i].substr(0, title));
+        prefix = IsPrefix(own, std::span(parts).subspan(i + 1)) ? own : Prefix();
       }
-      if (!prefix.Starts(line)) continue;
-      line = prefix.RestOf(line);
+      if (!prefix.Starts(parts[i])) continue;
+      parts[i] = prefix.RestOf(parts[i]);
       ++passed.prefixes;
     }
   }
 
-  bool IsPrefix(const Prefix& prefix, std::size_t title) const {
+  bool IsPrefix(const Prefix& prefix, std::span<const std::string_view> following) const {
+    const auto near = following.first(std::min(following.size(), mostForeign));
     const auto next =
-        std::find_if(lines.begin() + static_cast<std::ptrdiff_t>(title) + 1, lines.end(),
-                     [&](const Line& l) { return prefix.Starts(l.text); });
-    return next != lines.end() && prefix.RestOf(next->text).starts_with(versionStart);
+        std::ranges::find_if(near, [&](std::string_view part) { return prefix.Starts(part); });
+    return next != near.end() && prefix.RestOf(*next).starts_with(versionStart);
   }
 
-  std::string TextFrom(std::size_t begin) const {
-    std::string text;
-    for (std::size_t i = begin; i < lines.size(); ++i)
-      text.append(lines[i].text).append("\n");
-    return text;
+  std::size_t EndOf(std::size_t i) const {
+    return i + 1 < lines.size() ? lines[i + 1].begin : text.size();
+  }
+  std::string_view TextOf(std::size_t i) const {
+    return std::string_view(text).substr(lines[i].begin, EndOf(i) - lines[i].begin - 1);
+  }
+
+  /// Removes a line from the report that begins at `at`. The lines before it move towards it, so
+  /// that the cost doesn't grow with the rest of the text.
+  void Remove(std::size_t i) {
+    foreign.push_back(lines[i].number);
+    const std::size_t length = EndOf(i) - lines[i].begin;
+    char* const data = text.data();
+    std::move_backward(data + lines[at].begin, data + lines[i].begin, data + EndOf(i));
+    for (; i > at; --i)
+      lines[i] = {lines[i - 1].begin + length, lines[i - 1].number};
+    ++at;
   }
 
   /// Reads reports up to the end, or up to a line of another, which goes. False at the end.
@@ -116,8 +134,7 @@ private:
       const std::size_t i = base + failure.line - 1;
       at = std::max(at, base + title - 1);
       if (i < lines.size() && foreign.size() < mostForeign && !IsTitle(i)) {
-        foreign.push_back(lines[i].number);
-        lines.erase(lines.begin() + static_cast<std::ptrdiff_t>(i));
+        Remove(i);
       } else {
         if (result.cut.empty())
           result.cut = fmt::format("line {}: {}", NumberOf(i), failure.what());
@@ -132,7 +149,7 @@ private:
     const std::string written = WriteReport(report);
     Lines own(written);
     for (std::size_t i = title; i < at; ++i, own.Skip())
-      if (lines[i].text.size() < own.Get().size()) ++passed.blanks;
+      if (TextOf(i).size() < own.Get().size()) ++passed.blanks;
     if (passed.lines == 0 && !foreign.empty()) passed.firstLine = foreign.front();
     passed.lines += foreign.size();
     report.line = lines[title].number;
@@ -144,10 +161,10 @@ private:
   /// Whether a report begins here, with few lines of others in it so far.
   bool IsTitle(std::size_t i) const {
     constexpr std::size_t most = 10;
-    const auto next = lines.begin() + static_cast<std::ptrdiff_t>(i);
-    const auto end = next + std::min<std::ptrdiff_t>(most, lines.end() - next);
-    return next->text.starts_with(PoolTitle::pool) &&
-           std::any_of(next, end, [&](const Line& l) { return l.text.starts_with(versionStart); });
+    if (!TextOf(i).starts_with(PoolTitle::pool)) return false;
+    for (std::size_t next = i; next < std::min(i + most, lines.size()); ++next)
+      if (TextOf(next).starts_with(versionStart)) return true;
+    return false;
   }
 
   std::size_t NumberOf(std::size_t i) const {
@@ -156,6 +173,7 @@ private:
 
   const std::string versionStart = fmt::format("{}{}", headerIndent, PoolLabel::version);
   PassedOver& passed;
+  std::string text; ///< without prefixes, each line with its end
   std::vector<Line> lines;
   std::size_t at = 0;               ///< the next line
   std::vector<std::size_t> foreign; ///< lines removed from the report that is read

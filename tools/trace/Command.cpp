@@ -2,6 +2,7 @@
 // Test: tests/tools/tools_test.py.
 #include "common/Files.h"
 #include "common/Tool.h"
+#include "diagnostics/ReportLayout.h"
 #include "trace/History.h"
 #include "trace/Replay.h"
 #include "trace/Summary.h"
@@ -35,7 +36,7 @@ PoolNames NamesOf(const Options& options) {
     if (middle == std::string::npos || result.ec != std::errc() || result.ptr != end)
       throw CLI::ValidationError("--name",
                                  "takes POOL=NAME, with a pool's address as in its lines");
-    names[addr] = text.substr(middle + 1);
+    names.given[addr] = text.substr(middle + 1);
   }
   return names;
 }
@@ -63,26 +64,27 @@ void ApplySettings(const Options& options) {
 }
 
 /// Takes the names of pools from the reports between the trace lines, whose pools have the same
-/// addresses. A name that the user gives stays.
+/// addresses.
 class NameFinder {
 public:
-  explicit NameFinder(PoolNames& names_) : names(names_) {}
+  NameFinder(const TraceLedger& ledger_, PoolNames& names_) : ledger(ledger_), names(names_) {}
 
   void Take(std::string_view line) {
-    constexpr std::string_view title = "MemPool::Mgr ";
-    constexpr std::string_view address = "   Addr        : 0x";
-    if (line.starts_with(title)) {
-      name = line.substr(title.size());
+    if (line.ends_with('\r')) line.remove_suffix(1);
+    if (line.starts_with(PoolTitle::pool)) {
+      name = line.substr(std::string_view(PoolTitle::pool).size());
       linesLeft = 3; // the version's line precedes that of the address
     } else if (linesLeft > 0 && line.starts_with(address)) {
       std::uint64_t addr = 0;
       std::from_chars(line.data() + address.size(), line.data() + line.size(), addr, 16);
-      names.try_emplace(addr, name);
+      names.reported[ledger.GetIdAt(addr)] = name;
     }
     if (linesLeft > 0) --linesLeft;
   }
 
 private:
+  const std::string address = fmt::format("   {}0x", PoolLabel::addr);
+  const TraceLedger& ledger;
   PoolNames& names;
   std::string name;
   int linesLeft = 0;
@@ -94,7 +96,7 @@ template <class Take>
 std::uint64_t ReadTrace(const Options& options, TraceLedger& ledger, PoolNames& names, Take take) {
   Input input(options.file);
   Progress progress(input.GetSize());
-  NameFinder finder(names);
+  NameFinder finder(ledger, names);
   std::uint64_t number = 0;
   ForEachLine(input, progress, [&](std::string_view line, bool isWhole) {
     ++number;
@@ -118,10 +120,10 @@ void WarnOf(const TraceLedger& ledger, const PoolNames& names) {
       fmt::print(
           stderr,
           "vokmempool: {}: a Clear lies between line {} and line {}, the report is uncertain\n",
-          OneLine(NameOf(names, pool->addr)), span.after, span.before);
-    if (pool->made == 0)
+          OneLine(NameOf(names, pool->id)), span.after, span.before);
+    if (pool->id.made == 0)
       fmt::print(stderr, "vokmempool: {}: its first lines are not in the trace\n",
-                 OneLine(NameOf(names, pool->addr)));
+                 OneLine(NameOf(names, pool->id)));
   }
   if (ledger.mixed.count > 0)
     fmt::print(stderr, "vokmempool: {} mixed or cut lines were skipped, the first is line {}\n",

@@ -12,7 +12,7 @@ namespace VOK::MemPool::Tools {
 History::Snapshot History::SnapshotOf(LineNumber line, const TraceLedger& ledger) {
   Snapshot made{ledger.numEvents, line, ledger.bytes};
   for (const TracedPool* pool : ledger.GetLivePools())
-    made.pools.push_back({pool->addr, pool->made, pool->bytes});
+    made.pools.push_back({pool->id, pool->bytes});
   return made;
 }
 
@@ -56,8 +56,8 @@ std::string TreeAtPeak(const TraceLedger& ledger, const PoolNames& names) {
   const auto pools = ledger.GetPoolsAtPeak();
   std::string tree = fmt::format("heap_tree=peak\nn{}: {} (requests of pools, line {})\n",
                                  pools.size(), ledger.peakBytes, ledger.peakLine);
-  for (const auto& [addr, bytes] : pools)
-    tree += fmt::format(" n0: {} pool {}\n", bytes, OneLine(NameOf(names, addr)));
+  for (const auto& [pool, bytes] : pools)
+    tree += fmt::format(" n0: {} pool {}\n", bytes, OneLine(NameOf(names, pool)));
   return tree;
 }
 
@@ -78,14 +78,14 @@ std::string MassifText(const std::vector<History::Snapshot>& snapshots, const Tr
 
 std::vector<std::string> MassifTextsOfPools(const std::vector<History::Snapshot>& snapshots,
                                             const PoolNames& names, std::string_view source) {
-  std::map<std::pair<LineNumber, std::uint64_t>, std::vector<MassifPoint>> pools;
+  std::map<PoolId, std::vector<MassifPoint>> pools;
   for (const History::Snapshot& snapshot : snapshots)
-    for (const History::PoolBytes& pool : snapshot.pools)
-      pools[{pool.made, pool.addr}].push_back({snapshot.event, pool.bytes});
+    for (const History::PoolBytes& one : snapshot.pools)
+      pools[one.pool].push_back({snapshot.event, one.bytes});
   std::vector<std::string> texts;
-  for (auto& [key, points] : pools) {
+  for (auto& [pool, points] : pools) {
     const auto peak = std::ranges::max_element(points, {}, &MassifPoint::bytes);
-    const std::string what = "pool " + OneLine(NameOf(names, key.second));
+    const std::string what = "pool " + OneLine(NameOf(names, pool));
     peak->tree = fmt::format("heap_tree=peak\nn0: {} {}\n", peak->bytes, what);
     texts.push_back(MassifOf(what, source, points));
   }

@@ -16,8 +16,7 @@ namespace VOK::MemPool::Tools {
 class History {
 public:
   struct PoolBytes {
-    std::uint64_t addr;
-    LineNumber made; ///< tells pools of the same address apart
+    PoolId pool;
     std::uint64_t bytes;
   };
 

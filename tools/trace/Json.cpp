@@ -17,12 +17,13 @@ std::string DumpOf(const Json& json) {
 Json LineJson(LineNumber line) { return line == 0 ? Json() : Json(line); }
 
 Json PoolJson(const TracedPool& pool, const PoolNames& names) {
+  const std::string* const name = names.Find(pool.id);
   Json clears = Json::array();
   for (const ClearSpan& span : pool.clears.items)
     clears.push_back({{"after", span.after}, {"before", span.before}});
-  return {{"pool", BareAddress(pool.addr)},
-          {"name", names.contains(pool.addr) ? Json(names.at(pool.addr)) : Json()},
-          {"made", LineJson(pool.made)},
+  return {{"pool", BareAddress(pool.id.addr)},
+          {"name", name == nullptr ? Json() : Json(*name)},
+          {"made", LineJson(pool.id.made)},
           {"gone", LineJson(pool.gone)},
           {"requests", pool.requests},
           {"frees", pool.frees},
@@ -71,7 +72,7 @@ void WriteTraceJson(const TraceLedger& ledger, std::uint64_t numLines, const Poo
       write);
   const auto liveJson = [](const TraceLedger::Live& record) {
     return Json{{"line", record.line},
-                {"pool", BareAddress(record.pool)},
+                {"pool", BareAddress(record.pool.addr)},
                 {"data", BareAddress(record.data)},
                 {"size", record.size},
                 {"uncertain", record.isUncertain}};
@@ -104,9 +105,9 @@ void WriteTraceJson(const TraceLedger& ledger, std::uint64_t numLines, const Poo
       "refusedFrees", ledger.refused.items,
       [](const RefusedFree& free) {
         return Json{{"line", free.line},
-                    {"pool", BareAddress(free.pool)},
+                    {"pool", BareAddress(free.pool.addr)},
                     {"data", BareAddress(free.data)},
-                    {"liveIn", free.owner == 0 ? Json() : Json(BareAddress(free.owner))}};
+                    {"liveIn", free.owner ? Json(BareAddress(free.owner->addr)) : Json()}};
       },
       write);
   WriteArray(

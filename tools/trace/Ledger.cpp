@@ -35,7 +35,7 @@ void TraceLedger::TakeMixed(LineNumber line, std::string_view text) {
 
 /// The live pool of that address, which begins here if its construction isn't in the trace.
 TraceLedger::LivePool& TraceLedger::Find(std::uint64_t addr) {
-  if (recent != nullptr && recent->pool.addr == addr) return *recent;
+  if (recent != nullptr && recent->pool.id.addr == addr) return *recent;
   const auto found = livePools.find(addr);
   recent = found == livePools.end() ? &Begin(addr, 0) : &found->second;
   return *recent;
@@ -44,8 +44,7 @@ TraceLedger::LivePool& TraceLedger::Find(std::uint64_t addr) {
 TraceLedger::LivePool& TraceLedger::Begin(std::uint64_t addr, LineNumber line) {
   LivePool& begun = livePools[addr];
   begun.key = ++lastKey;
-  begun.pool.addr = addr;
-  begun.pool.made = line;
+  begun.pool.id = {line, addr};
   addrByKey[begun.key] = addr;
   return begun;
 }
@@ -55,7 +54,7 @@ void TraceLedger::End(std::uint64_t addr, LineNumber line) {
   if (found == livePools.end()) return;
   TracedPool& pool = found->second.pool;
   MarkPeak(pool);
-  if (pool.bytesAtPeak > 0) endedSincePeak.emplace_back(addr, pool.bytesAtPeak);
+  if (pool.bytesAtPeak > 0) endedSincePeak.emplace_back(pool.id, pool.bytesAtPeak);
   pool.gone = line;
   bytes -= pool.bytes;
   numStale += pool.records + pool.uncertainRecords;
@@ -82,7 +81,7 @@ void TraceLedger::KeepLeft(const LivePool& at) {
 }
 
 TraceLedger::Live TraceLedger::LiveOf(const LiveRecord& record, const TracedPool& pool) {
-  return {record.data, pool.addr, record.line, record.size, record.line < pool.clearBefore,
+  return {record.data, pool.id, record.line, record.size, record.line < pool.clearBefore,
           pool.gone};
 }
 
@@ -119,7 +118,8 @@ void TraceLedger::Free(LivePool& at, LineNumber line, const TraceEvent& event, V
   LiveRecord* const record = live.Find(event.data);
   const TracedPool* const owner = record == nullptr ? nullptr : OwnerOf(*record);
   if (owner != &pool) {
-    refused.Add({line, pool.addr, event.data, owner == nullptr ? 0 : owner->addr});
+    refused.Add(
+        {line, pool.id, event.data, owner == nullptr ? std::nullopt : std::optional(owner->id)});
     verdict.outcome = Outcome::Refused;
     return;
   }
@@ -157,7 +157,7 @@ void TraceLedger::ProveClear(TracedPool& owner, LineNumber after, LineNumber bef
   owner.clears.Add({after, before});
   ++numClears;
   owner.clearBefore = before;
-  verdict.cleared = owner.addr;
+  verdict.cleared = owner.id.addr;
   MarkPeak(owner);
   bytes -= owner.bytes;
   owner.uncertainRecords += owner.records;
@@ -179,13 +179,16 @@ void TraceLedger::DropStale() {
   numStale = 0;
 }
 
+PoolId TraceLedger::GetIdAt(std::uint64_t addr) const {
+  const auto found = livePools.find(addr);
+  return found == livePools.end() ? PoolId{0, addr} : found->second.pool.id;
+}
+
 std::vector<const TracedPool*> TraceLedger::GetLivePools() const {
   std::vector<const TracedPool*> pools;
   for (const auto& [addr, at] : livePools)
     pools.push_back(&at.pool);
-  std::sort(pools.begin(), pools.end(), [](const TracedPool* a, const TracedPool* b) {
-    return std::pair(a->made, a->addr) < std::pair(b->made, b->addr);
-  });
+  std::ranges::sort(pools, {}, &TracedPool::id);
   return pools;
 }
 
@@ -201,11 +204,11 @@ std::vector<TraceLedger::Live> TraceLedger::GetLiveRecords() const {
   return records;
 }
 
-std::vector<std::pair<std::uint64_t, std::uint64_t>> TraceLedger::GetPoolsAtPeak() const {
+std::vector<std::pair<PoolId, std::uint64_t>> TraceLedger::GetPoolsAtPeak() const {
   auto pools = endedSincePeak;
   for (const auto& [addr, at] : livePools) {
     const std::uint64_t held = at.pool.peakMark == numPeaks ? at.pool.bytesAtPeak : at.pool.bytes;
-    if (held > 0) pools.emplace_back(addr, held);
+    if (held > 0) pools.emplace_back(at.pool.id, held);
   }
   std::sort(pools.begin(), pools.end(), [](const auto& a, const auto& b) {
     return std::pair(b.second, a.first) < std::pair(a.second, b.first);

@@ -8,9 +8,11 @@
 #include "trace/Reader.h"
 
 #include <array>
+#include <compare>
 #include <cstddef>
 #include <cstdint>
 #include <map>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <unordered_map>
@@ -39,9 +41,16 @@ struct ClearSpan {
   LineNumber after, before;
 };
 
-struct TracedPool {
+/// Two pools of one address differ in the line of their construction.
+struct PoolId {
+  LineNumber made = 0;
   std::uint64_t addr = 0;
-  LineNumber made = 0, gone = 0;
+  auto operator<=>(const PoolId&) const = default;
+};
+
+struct TracedPool {
+  PoolId id;
+  LineNumber gone = 0;
   std::uint64_t requests = 0, frees = 0;
   std::uint64_t records = 0, bytes = 0; ///< certainly live; of a destroyed pool, at its end
   std::uint64_t uncertainRecords = 0, uncertainBytes = 0;
@@ -56,8 +65,9 @@ struct TracedPool {
 /// A freed pointer that wasn't live in its pool.
 struct RefusedFree {
   LineNumber line;
-  std::uint64_t pool, data;
-  std::uint64_t owner; ///< the pool in which it was live, 0 for none
+  PoolId pool;
+  std::uint64_t data;
+  std::optional<PoolId> owner; ///< the pool in which it was live
 };
 
 struct MixedLine {
@@ -68,7 +78,8 @@ struct MixedLine {
 class TraceLedger {
 public:
   struct Live {
-    std::uint64_t data, pool;
+    std::uint64_t data;
+    PoolId pool;
     LineNumber line;
     std::uint32_t size;
     bool isUncertain;
@@ -100,6 +111,9 @@ public:
   Verdict Take(LineNumber line, const TraceEvent& event);
   void TakeMixed(LineNumber line, std::string_view text);
 
+  /// The live pool of an address, also one without a trace line so far.
+  PoolId GetIdAt(std::uint64_t addr) const;
+
   /// By the line of their construction, and at the same line by address.
   std::vector<const TracedPool*> GetLivePools() const;
 
@@ -107,7 +121,7 @@ public:
   std::vector<Live> GetLiveRecords() const;
 
   /// What each pool held at the peak, largest first.
-  std::vector<std::pair<std::uint64_t, std::uint64_t>> GetPoolsAtPeak() const;
+  std::vector<std::pair<PoolId, std::uint64_t>> GetPoolsAtPeak() const;
 
 private:
   struct LivePool {
@@ -130,8 +144,8 @@ private:
   LiveTable live;                                        ///< also those of ended pools, for a while
   std::uint64_t numStale = 0;                            ///< entries of ended pools
   std::unordered_map<std::uint64_t, LivePool> livePools; ///< by address
-  std::unordered_map<std::uint32_t, std::uint64_t> addrByKey;          ///< of live pools
-  std::vector<std::pair<std::uint64_t, std::uint64_t>> endedSincePeak; ///< address and bytes
+  std::unordered_map<std::uint32_t, std::uint64_t> addrByKey;   ///< of live pools
+  std::vector<std::pair<PoolId, std::uint64_t>> endedSincePeak; ///< with bytes
   std::uint32_t lastKey = 0;
   std::uint64_t numPeaks = 0;
   LivePool* recent = nullptr; ///< the pool of the previous line, likely that of the next too

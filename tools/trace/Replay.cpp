@@ -44,7 +44,7 @@ Mgr& Replay::PoolOf(std::uint64_t addr) {
 
 void Replay::Construct(std::uint64_t addr) {
   pools.erase(addr);
-  const std::string name = NameOf(names, addr);
+  const std::string name = NameOf(names, {0, addr});
   if (GetMgr(name.c_str()) != nullptr)
     throw Failure(fmt::format("two live pools have the name {}", OneLine(name)));
   pools[addr] = std::make_unique<Mgr>(name.c_str());

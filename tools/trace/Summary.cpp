@@ -27,11 +27,15 @@ std::string Section(std::string_view title, const Items& items, std::uint64_t co
   return text;
 }
 
-std::string PoolText(const TracedPool& pool, const PoolNames& names) {
+std::string LineNameOf(const PoolNames& names, const PoolId& pool) {
+  return OneLine(NameOf(names, pool));
+}
+
+std::string PoolText(const TracedPool& pool, const PoolNames& names, std::string_view left) {
   std::string text = fmt::format(
       "{}: construction {}, requests {}, freed {}, peak {} bytes, {} {} records of {} bytes",
-      NameOf(names, pool.addr), LineText(pool.made), pool.requests, pool.frees, pool.peakBytes,
-      pool.gone == 0 ? "live" : "left", pool.records, pool.bytes);
+      LineNameOf(names, pool.id), LineText(pool.id.made), pool.requests, pool.frees, pool.peakBytes,
+      left, pool.records, pool.bytes);
   if (pool.uncertainRecords > 0)
     text += fmt::format(", uncertain {} of {} bytes", pool.uncertainRecords, pool.uncertainBytes);
   for (const ClearSpan& span : pool.clears.items)
@@ -69,9 +73,15 @@ std::string Lifetimes(const TraceLedger& ledger) {
 
 std::string BareAddress(std::uint64_t addr) { return fmt::format("{:x}", addr); }
 
-std::string NameOf(const PoolNames& names, std::uint64_t addr) {
-  const auto found = names.find(addr);
-  return found == names.end() ? BareAddress(addr) : found->second;
+const std::string* PoolNames::Find(const PoolId& pool) const {
+  if (const auto found = given.find(pool.addr); found != given.end()) return &found->second;
+  const auto found = reported.find(pool);
+  return found == reported.end() ? nullptr : &found->second;
+}
+
+std::string NameOf(const PoolNames& names, const PoolId& pool) {
+  const std::string* const name = names.Find(pool);
+  return name == nullptr ? BareAddress(pool.addr) : *name;
 }
 
 std::string SummariseTrace(const TraceLedger& ledger, std::uint64_t numLines,
@@ -85,14 +95,15 @@ std::string SummariseTrace(const TraceLedger& ledger, std::uint64_t numLines,
       fmt::format("peak of live bytes: {} at {}{}\n", ledger.peakBytes, LineText(ledger.peakLine),
                   ledger.numClears > 0 ? ", at most: a Clear has no line" : "");
   text += Section("live pools", pools, pools.size(),
-                  [&](const TracedPool* pool) { return PoolText(*pool, names); });
+                  [&](const TracedPool* pool) { return PoolText(*pool, names, "live"); });
   text +=
       Section("destroyed pools", ledger.gone.items, ledger.gone.count, [&](const TracedPool& pool) {
-        return fmt::format("destruction {}: {}", LineText(pool.gone), PoolText(pool, names));
+        return fmt::format("destruction {}: {}", LineText(pool.gone),
+                           PoolText(pool, names, "left"));
       });
   const auto recordText = [&](const TraceLedger::Live& record) {
     return fmt::format("line {}: {} bytes at {} of {}{}", record.line, record.size,
-                       BareAddress(record.data), NameOf(names, record.pool),
+                       BareAddress(record.data), LineNameOf(names, record.pool),
                        record.isUncertain ? ", uncertain: a Clear follows it" : "");
   };
   text += Section("live records at the end", live, live.size(), recordText);
@@ -106,8 +117,8 @@ std::string SummariseTrace(const TraceLedger& ledger, std::uint64_t numLines,
       Section("freed pointers that were not live in their pool", ledger.refused.items,
               ledger.refused.count, [&](const RefusedFree& free) {
                 return fmt::format("line {}: {} to {}{}", free.line, BareAddress(free.data),
-                                   NameOf(names, free.pool),
-                                   free.owner == 0 ? "" : ", live in " + NameOf(names, free.owner));
+                                   LineNameOf(names, free.pool),
+                                   free.owner ? ", live in " + LineNameOf(names, *free.owner) : "");
               });
   text += Section("skipped lines, which are mixed or cut", ledger.mixed.items, ledger.mixed.count,
                   [](const MixedLine& line) {

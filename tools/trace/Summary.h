@@ -12,14 +12,20 @@
 
 namespace VOK::MemPool::Tools {
 
-/// The names that the user gives to pools, by address.
-using PoolNames = std::map<std::uint64_t, std::string>;
+/// The names of pools: those that the user gives to addresses, and those in reports of the text.
+struct PoolNames {
+  std::map<std::uint64_t, std::string> given;
+  std::map<PoolId, std::string> reported;
+
+  /// A given name comes first. Null if the pool has none.
+  const std::string* Find(const PoolId& pool) const;
+};
 
 /// A pool's address as the trace shows it.
 std::string BareAddress(std::uint64_t addr);
 
 /// A pool's name, or its address if it has none.
-std::string NameOf(const PoolNames& names, std::uint64_t addr);
+std::string NameOf(const PoolNames& names, const PoolId& pool);
 
 /// `numLines` is the number of all lines of the text.
 std::string SummariseTrace(const TraceLedger& ledger, std::uint64_t numLines,
