@@ -31,15 +31,17 @@ std::size_t DistanceOf(const std::string& a, const std::string& b) {
   return row.back();
 }
 
-/// What is wrong with the arguments; for a mistyped subcommand the nearest.
+/// What is wrong with the arguments; for a mistyped subcommand the nearest, if one is near.
 std::string Explain(const CLI::App& app, const char* first, const CLI::ParseError& error) {
-  if (first == nullptr || *first == '-') return error.what();
+  if (first == nullptr) return error.what();
   const auto all = app.get_subcommands([](const CLI::App*) { return true; });
   const auto distance = [&](const CLI::App* one) { return DistanceOf(first, one->get_name()); };
-  const auto* const nearest = *std::ranges::min_element(all, {}, distance);
-  return distance(nearest) == 0 ? error.what()
-                                : fmt::format("there is no subcommand {}, the nearest is {}", first,
-                                              nearest->get_name());
+  const CLI::App* const nearest = *std::ranges::min_element(all, {}, distance);
+  if (distance(nearest) == 0) return error.what();
+  std::string text = fmt::format("there is no subcommand {}", Tools::OneLine(first));
+  if (2 * distance(nearest) <= nearest->get_name().size() + 1)
+    text += fmt::format(", the nearest is {}", nearest->get_name());
+  return text;
 }
 
 int Run(int argc, char** argv) {

@@ -43,6 +43,7 @@ COMMANDS = [
     *((f"{name} --help", "", 0, "*Example: *", "") for name in ("report", "picture", "trace", "chart")),
     ("--version", "", 0, "vokmempool 1.*", ""),
     ("reprot", "", 2, "", "there is no subcommand reprot, the nearest is report" + USAGE),
+    ("xyzzy", "", 2, "", "there is no subcommand xyzzy" + USAGE),
     ("report --json --check", "", 2, "", "*[--summary,--json,--check,--text,*]" + USAGE),
     ("report /no/such", "", 1, "", "/no/such: can't be opened: No such file or directory\n"),
     ("report /", "", 1, "", "/: can't be read: Is a directory\n"),
@@ -50,6 +51,8 @@ COMMANDS = [
      "standard input: line 2: expected \"   Version     : \"*, found \"" + 60 * "x" + "\"\n"),
     ("report --from-json", '{"reports":\n [}', 1, "",
      "standard input: not a JSON document: line 2, column 3\n"),
+    ("report --from-json", '{"reports": 1e999}', 1, "",
+     "standard input: not a document of reports: a number is too large\n"),
     ("report --from-json", '{"report": []}', 1, "",
      'standard input: not a document of reports: it lacks "reports"\n'),
     ("report --from-json", '{"other": [{}], "reports": []}', 1, "",
@@ -67,6 +70,9 @@ detailed         25         27          3      12349804      12349032  100.0 %
      "line *\nline *\n", "standard input: 2 inconsistencies\n"),
     ("report", DEMO.replace("  508\n", "  509\n"), 0, "*\ndemo *",
      "standard input: 1 inconsistency, --check lists them\n"),
+    ("report", DEMO * 2, 0, "      line pool *\n         1 demo *\n        57 demo *\n", ""),
+    ("report --diff - -", "", 2, "", "--diff: one of two files at most is standard input" + USAGE),
+    ("report --diff /dev/null", DEMO, 1, "", "/dev/null: there is no report in it\n"),
     ("report --check", DEMO * 2, 0, "2 reports, no contradiction\n", ""),
     ("report --text", DEMO + DETAILED[:999], 1, DEMO, "standard input: line *: expected *"),
     ("report --check", DEMO.replace("  508\n", "  509\n") + DETAILED[:999], 1, "line 10: *\n",
@@ -305,6 +311,10 @@ def test_growth():
     same([row[2:6] for row in series[1:] if row[1].startswith('"a')],
          [[str(report["header"][key]) for key in ("usedRecs", "freeRecs", "extRecs", "numBuckets")]
           for report in (was, now)], "the rows of a pool")
+    rows = json.loads(tool("report", "--series=json", given=half + ours))
+    same([[str(row[key]) for key in series[0] if key != "pool"] for row in rows],
+         [row[:1] + row[2:] for row in series[1:]], "the same rows as JSON")
+    same([row["pool"] for row in rows[::2]], ['a "b"\\'] * 2, "the pools of the rows")
     metrics = tool("report", "--prometheus", given=half + ours)
     same(re.findall(r'^vokmempool_used_records\{pool="a \\"b\\"\\\\"\} (.*)', metrics, re.M),
          [str(now["header"]["usedRecs"])], "the metric of the last report")

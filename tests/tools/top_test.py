@@ -54,6 +54,8 @@ with tempfile.TemporaryDirectory() as folder:
         same(run(PROGRAM, "top", child.pid)[1:],
              (f"vokmempool: {child.pid}: standard output is no terminal; --batch N prints rounds\n", 1),
              "no terminal")
+        same(run(PROGRAM, "top", "1x")[1].splitlines()[0],
+             "vokmempool: PID: takes the number of a process, from 1 to 2147483647, and not 1x", "1x")
         run(*TMUX, "new-session", "-d", "-x", 100, "-y", 12, f"{PROGRAM} top --every .1 {child.pid}")
         same(rows_of(screen("a ")), own, "the screen")
         child.send_signal(signal.SIGCONT)

@@ -1,6 +1,7 @@
 // vokmempool inspect: the pools of a running process, or of a core file, without the program's
 // help. Test: tests/tools/inspect_test.py.
 #include "common/Files.h"
+#include "common/Numbers.h"
 #include "common/Tool.h"
 #include "inspect/Pools.h"
 #include "report/Check.h"
@@ -130,7 +131,7 @@ void AddInspect(CLI::App& app) {
   command->add_option("PID|CORE", options->source, "the process, or the core file")->required();
   command->add_flag("--stop", options->stop, "stop the process while it is read");
   command->add_option("--every", options->every, "seconds until the process is read again")
-      ->check(CLI::Range(0.01, 86400.0));
+      ->check(NumberFrom(0.01, 86400.0, "seconds"));
   CLI::Option_group* const form = command->add_option_group("Form");
   form->add_flag("--summary", options->summary, "a table of the pools (if no other form is named)");
   form->add_flag("--json", options->json, "a JSON document of all that DbgDetailed would print");

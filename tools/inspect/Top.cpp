@@ -2,6 +2,7 @@
 // counters of each pool; records are counted for one pool alone, when it is asked for.
 // Test: tests/tools/top_test.py.
 #include "common/Files.h"
+#include "common/Numbers.h"
 #include "common/Tool.h"
 #include "inspect/Library.h"
 #include "inspect/Pools.h"
@@ -271,11 +272,13 @@ void AddTop(CLI::App& app) {
   const auto options = std::make_shared<Options>();
   CLI::App* const command =
       app.add_subcommand("top", "Shows the pools of a process by what they hold, live");
-  command->add_option("PID", options->process, "the process")->required();
+  command->add_option("PID", options->process, "the process")
+      ->required()
+      ->check(NumberFrom(1, INT32_MAX, "the number of a process"));
   command->add_option("--batch", options->batch, "print so many rounds in place of a live table")
-      ->check(CLI::Range(1, INT32_MAX));
+      ->check(NumberFrom(1, INT32_MAX, "a number of rounds"));
   command->add_option("--every", options->every, "seconds from round to round")
-      ->check(CLI::Range(0.01, 86400.0));
+      ->check(NumberFrom(0.01, 86400.0, "seconds"));
   command->footer("Example: which pool grows, and which of its sizes?\n"
                   "  vokmempool top $(pidof program)");
   command->callback([options] { Run(*options); });

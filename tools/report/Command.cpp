@@ -16,10 +16,12 @@ namespace VOK::MemPool::Tools {
 namespace {
 
 struct Options {
-  std::string file = "-", before;
+  std::string file = "-", before, series;
   bool json = false, summary = false, check = false, text = false, prometheus = false,
-       series = false, fromJson = false, lenient = false, records = false;
+       fromJson = false, lenient = false, records = false;
 };
+
+constexpr const char* noReport = "there is no report in it";
 
 ReportText Read(const std::string& file, const Options& options) {
   const std::string text = Input(file).ReadAll();
@@ -34,8 +36,9 @@ ReportText Read(const std::string& file, const Options& options) {
 
 std::string DifferenceSince(const std::vector<Report>& now, const Options& options) {
   const ReportText before = Read(options.before, options);
-  if (!before.cut.empty())
-    throw Failure(fmt::format("{}: {}", NameOfFile(options.before), before.cut));
+  if (!before.cut.empty() || before.reports.empty())
+    throw Failure(fmt::format("{}: {}", NameOfFile(options.before),
+                              before.cut.empty() ? noReport : before.cut));
   return Difference(before.reports, now, options.records);
 }
 
@@ -48,8 +51,8 @@ std::string Show(const std::vector<Report>& reports, const Options& options) {
     Print(DifferenceSince(reports, options));
   else if (options.prometheus)
     Print(PrometheusText(reports));
-  else if (options.series)
-    Print(SeriesText(reports));
+  else if (!options.series.empty())
+    Print(options.series == "json" ? SeriesJson(reports) : SeriesText(reports));
   else if (options.text)
     for (const Report& report : reports)
       Print(WriteReport(report));
@@ -63,12 +66,14 @@ std::string Show(const std::vector<Report>& reports, const Options& options) {
 }
 
 void Run(const Options& options) {
+  if (options.before == "-" && options.file == "-")
+    throw CLI::ValidationError("--diff", "one of two files at most is standard input");
   const ReportText text = Read(options.file, options);
   std::string failure;
   if (!text.reports.empty())
     failure = Show(text.reports, options);
   else if (text.cut.empty())
-    failure = "there is no report in it";
+    failure = noReport;
   if (!failure.empty() && !text.cut.empty()) failure += "; ";
   failure += text.cut;
   if (!failure.empty()) throw Failure(fmt::format("{}: {}", NameOfFile(options.file), failure));
@@ -93,7 +98,9 @@ void AddReport(CLI::App& app) {
   form->add_flag("--check", options->check, "each inconsistency in a report, with its line");
   form->add_flag("--text", options->text, "the reports alone, as the library prints them");
   form->add_flag("--prometheus", options->prometheus, "the last figures of each pool as metrics");
-  form->add_flag("--series", options->series, "a row for each report as CSV");
+  form->add_flag("--series{csv}", options->series,
+                 "a row for each report as CSV, or with --series=json as JSON")
+      ->check(CLI::IsMember({"csv", "json"}).description(""));
   CLI::Option* const diff = form->add_option(
       "--diff", options->before, "an earlier output of the same process: what has changed since");
   form->require_option(0, 1);

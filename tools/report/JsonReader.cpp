@@ -239,7 +239,11 @@ ReportText ReadJson(std::string_view document) {
   } catch (const Json::parse_error& error) {
     return {{}, "not a JSON document: " + PlaceOf(document, error.byte)};
   } catch (const Json::out_of_range& error) {
-    return {{}, "not a document of reports: it lacks " + LastQuoted(error.what())};
+    constexpr int noKey = 403;
+    return {{},
+            "not a document of reports: " + (error.id == noKey
+                                                 ? "it lacks " + LastQuoted(error.what())
+                                                 : "a number is too large")};
   } catch (const Json::exception&) {
     return {{}, "not a document of reports: a value has another type than in one of --json"};
   } catch (const Failure& failure) {

@@ -5,6 +5,8 @@
 #include <algorithm>
 #include <fmt/format.h>
 #include <map>
+#include <nlohmann/json.hpp>
+#include <set>
 #include <string_view>
 
 namespace VOK::MemPool::Tools {
@@ -27,12 +29,17 @@ Bytes BytesOf(const Report& report) {
 }
 
 std::string Summarise(const std::vector<Report>& reports, const std::vector<std::string>& marks) {
-  constexpr auto form = "{:<{}} {:>10} {:>10} {:>10} {:>13} {:>13} {:>8}{}\n";
+  constexpr auto form = "{}{:<{}} {:>10} {:>10} {:>10} {:>13} {:>13} {:>8}{}\n";
+  constexpr auto lineForm = "{:>10} ";
   std::size_t width = 4;
-  for (const Report& report : reports)
+  std::set<std::string_view> names;
+  for (const Report& report : reports) {
     width = std::max(width, OneLine(report.name).size());
-  std::string text =
-      fmt::format(form, "pool", width, "used", "free", "ext", "bytes held", "payload", "share", "");
+    names.insert(report.name);
+  }
+  const bool hasLines = names.size() < reports.size();
+  std::string text = fmt::format(form, hasLines ? fmt::format(lineForm, "line") : "", "pool", width,
+                                 "used", "free", "ext", "bytes held", "payload", "share", "");
   for (std::size_t i = 0; i < reports.size(); ++i) {
     const Report& report = reports[i];
     const Bytes bytes = BytesOf(report);
@@ -40,7 +47,8 @@ std::string Summarise(const std::vector<Report>& reports, const std::vector<std:
         bytes.held == 0 ? "-"
                         : fmt::format("{:.1f} %", static_cast<double>(bytes.payload) * 100.0 /
                                                       static_cast<double>(bytes.held));
-    text += fmt::format(form, OneLine(report.name), width, report.usedRecs, report.freeRecs,
+    text += fmt::format(form, hasLines ? fmt::format(lineForm, report.line) : "",
+                        OneLine(report.name), width, report.usedRecs, report.freeRecs,
                         report.numExtRecs, bytes.held, bytes.payload, share,
                         (report.IsOff() ? " off" : "") + (marks.empty() ? "" : marks[i]));
   }
@@ -113,6 +121,17 @@ std::string SeriesText(const std::vector<Report>& reports) {
     text += '\n';
   }
   return text;
+}
+
+std::string SeriesJson(const std::vector<Report>& reports) {
+  using Json = nlohmann::ordered_json;
+  Json rows = Json::array();
+  for (const Report& report : reports) {
+    Json& row = rows.emplace_back(Json{{"line", report.line}, {"pool", report.name}});
+    for (const Metric& metric : metrics)
+      row[metric.name] = metric.get(report);
+  }
+  return rows.dump(-1, ' ', false, Json::error_handler_t::replace) + "\n";
 }
 
 } // namespace VOK::MemPool::Tools

@@ -19,7 +19,8 @@ struct Bytes {
 
 Bytes BytesOf(const Report& report);
 
-/// A table with a row for each report; `marks` ends the rows.
+/// A table with a row for each report; `marks` ends the rows. Their lines come first where a pool
+/// has several reports.
 std::string Summarise(const std::vector<Report>& reports,
                       const std::vector<std::string>& marks = {});
 
@@ -29,6 +30,9 @@ std::string PrometheusText(const std::vector<Report>& reports);
 
 /// A row for each report as CSV, with its line, under a row of headings.
 std::string SeriesText(const std::vector<Report>& reports);
+
+/// The same as a JSON array of objects.
+std::string SeriesJson(const std::vector<Report>& reports);
 
 } // namespace VOK::MemPool::Tools
 

@@ -1,6 +1,7 @@
 // vokmempool trace: reads the trace lines in a program's output and shows what they add up to.
 // Test: tests/tools/tools_test.py.
 #include "common/Files.h"
+#include "common/Numbers.h"
 #include "common/Tool.h"
 #include "diagnostics/ReportLayout.h"
 #include "trace/History.h"
@@ -39,19 +40,6 @@ PoolNames NamesOf(const Options& options) {
     names.given[addr] = text.substr(middle + 1);
   }
   return names;
-}
-
-/// Refuses anything else, and says what the number is of.
-CLI::Validator NumberFrom(std::uint64_t least, std::uint64_t most, const char* what) {
-  const auto check = [=](const std::string& text) {
-    std::uint64_t number = 0;
-    const char* const end = text.data() + text.size();
-    const auto result = std::from_chars(text.data(), end, number);
-    if (result.ec == std::errc() && result.ptr == end && number >= least && number <= most)
-      return std::string();
-    return fmt::format("takes {}, from {} to {}, and not {}", what, least, most, text);
-  };
-  return {check, ""};
 }
 
 void ApplySettings(const Options& options) {
@@ -187,7 +175,7 @@ void AddTrace(CLI::App& app) {
       ->multi_option_policy(CLI::MultiOptionPolicy::TakeAll);
   CLI::Option* const at =
       command->add_option("--at", options->at, "rebuild the pools as of this line, and report them")
-          ->check(NumberFrom(1, UINT64_MAX, "the number of a line"));
+          ->check(NumberFrom<std::uint64_t>(1, UINT64_MAX, "the number of a line"));
   command->add_flag("--json", options->json, "a JSON document")->excludes(at);
   command->add_option("--massif", options->massif, "also write a file for ms_print")->excludes(at);
   command
@@ -196,7 +184,8 @@ void AddTrace(CLI::App& app) {
       ->excludes(at);
   const auto setting = [&](CLI::Option* option) { return option->needs(at)->group("With --at"); };
   const auto size = [&](const char* name, std::optional<unsigned>& value, const char* text) {
-    setting(command->add_option(name, value, text))->check(NumberFrom(0, UINT32_MAX, "bytes"));
+    setting(command->add_option(name, value, text))
+        ->check(NumberFrom<unsigned>(0, UINT32_MAX, "bytes"));
   };
   setting(command->add_flag("--detailed", options->detailed, "each bucket with its records"));
   setting(command->add_flag("--off", options->off, "the program's pooling was off"));
