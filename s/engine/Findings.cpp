@@ -30,14 +30,9 @@ const char* TextOf(Finding::Kind kind) {
 }
 
 const char* TextOfUnknown(Finding::Kind kind) {
-  switch (kind) {
-  case Finding::Kind::StrayFree:
-    return ", no record of this pool";
-  case Finding::Kind::DamagedHeader:
-    return ", a bucket";
-  default:
-    return ", a record never allocated";
-  }
+  if (kind == Finding::Kind::StrayFree) return ", no record of this pool";
+  if (kind == Finding::Kind::DamagedHeader) return ", a bucket";
+  return ", a record never allocated";
 }
 
 } // namespace

@@ -13,7 +13,6 @@ namespace {
 
 struct Figures {
   std::uint64_t used = 0, free = 0, buckets = 0, held = 0, payload = 0;
-  bool operator==(const Figures&) const = default;
 };
 
 /// The figures of a pool, those of its buckets by record size, and the used records by address.

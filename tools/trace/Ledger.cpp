@@ -188,7 +188,7 @@ std::vector<const TracedPool*> TraceLedger::GetLivePools() const {
   std::vector<const TracedPool*> pools;
   for (const auto& [addr, at] : livePools)
     pools.push_back(&at.pool);
-  std::ranges::sort(pools, {}, &TracedPool::id);
+  std::ranges::sort(pools, [](const TracedPool* a, const TracedPool* b) { return a->id < b->id; });
   return pools;
 }
 

@@ -16,6 +16,7 @@
 #include <string>
 #include <string_view>
 #include <unordered_map>
+#include <utility>
 #include <vector>
 
 namespace VOK::MemPool::Tools {
@@ -45,7 +46,9 @@ struct ClearSpan {
 struct PoolId {
   LineNumber made = 0;
   std::uint64_t addr = 0;
-  auto operator<=>(const PoolId&) const = default;
+  bool operator<(const PoolId& other) const {
+    return std::pair(made, addr) < std::pair(other.made, other.addr);
+  }
 };
 
 struct TracedPool {
