@@ -91,15 +91,19 @@ bool IsSame(const Pool& a, const Pool& b) {
 }
 
 /// What two passes agree on, or the last of four with false. A damage can be the state within an
-/// operation, so the process gets time to end it.
+/// operation, and the process may wait for a processor in it: so four passes over some time have to
+/// agree on one.
 template <class Read>
 auto ReadAgreed(Read read) {
+  constexpr int most = 3;
+  int numSame = 0;
   auto result = read();
-  for (int i = 0; i < 3; ++i) {
-    if (!result.damages.empty()) std::this_thread::sleep_for(std::chrono::milliseconds(20));
+  for (int i = 0; i < most; ++i) {
+    if (!result.damages.empty()) std::this_thread::sleep_for(std::chrono::milliseconds(100));
     auto again = read();
-    if (IsSame(result, again)) return std::pair(result, true);
+    numSame = IsSame(result, again) ? numSame + 1 : 0;
     result = std::move(again);
+    if (numSame > 0 && (result.damages.empty() || numSame == most)) return std::pair(result, true);
   }
   return std::pair(result, false);
 }
