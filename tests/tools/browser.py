@@ -26,8 +26,8 @@ class Browser:
         self.session = {"sessionId": attached["sessionId"]}
         for domain in ("Page", "Runtime", "Log", "Network"):
             self.call(f"{domain}.enable")
-        self.call("Emulation.setDeviceMetricsOverride", width=1280, height=height,
-                  deviceScaleFactor=1, mobile=False)
+        self.height = height
+        self.resize(1280)
 
     def __enter__(self):
         return self
@@ -72,6 +72,10 @@ class Browser:
         while self.read().get("method") != "Page.loadEventFired":
             pass
         self.settle()
+
+    def resize(self, width):
+        self.call("Emulation.setDeviceMetricsOverride", width=width, height=self.height,
+                  deviceScaleFactor=1, mobile=width < 600)
 
     def evaluate(self, expression):
         result = self.call("Runtime.evaluate", expression=expression, returnByValue=True,

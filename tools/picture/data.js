@@ -29,6 +29,9 @@ class Bits {
   }
 }
 
+/** The sum of the values that some items have under a key. */
+const sumOf = (items, key) => items.reduce((sum, item) => sum + (item[key] ?? 0), 0);
+
 /** A flag per record; those beyond the end of the text are false. */
 function flagsOf(text, count) {
   const bits = new Bits(text);
@@ -45,6 +48,7 @@ class Bucket {
     this.change ??= "";
     this.dataSize = Math.max(0, this.recSize - pool.sizeofHeader);
     this.percent = this.count > 0 ? (this.used * 100) / this.count : 0;
+    this.isDamaged = this.damaged !== "" || pool.faultyBuckets.has(i);
   }
 
   /** Types, next offsets of the free ones, damage, and what was in use before. */
@@ -112,13 +116,14 @@ class Pool {
     Object.assign(this, source);
     this.index = index;
     this.faults = source.faults.map(([line, bucket, record, text]) => ({ line, bucket, record, text }));
+    this.faultyBuckets = new Set(this.faults.map((fault) => fault.bucket));
     this.buckets = source.buckets.id.map((_, i) => new Bucket(this, source.buckets, i));
     this.classes = this.makeClasses();
     this.presentBuckets = this.buckets.filter((bucket) => bucket.change !== "went").length;
     this.presentExt = source.ext.filter((row) => row[2] !== "went").length;
     this.label = source.name === "" ? "(no name)" : source.name;
-    this.came = this.sum("came");
-    this.went = this.sum("went");
+    this.came = sumOf(this.buckets, "came");
+    this.went = sumOf(this.buckets, "went");
     // The strips of a pool share one scale: bytes of the largest record area.
     this.area = this.classes.reduce((area, sizeClass) => Math.max(area, sizeClass.area), 1);
   }
@@ -129,7 +134,7 @@ class Pool {
       const { group, recSize, dataSize } = bucket;
       const key = `${group} ${recSize}`;
       if (!classes.has(key))
-        classes.set(key, { group, recSize, dataSize, buckets: 0, used: 0, free: 0, came: 0, went: 0, area: 0 });
+        classes.set(key, { group, recSize, dataSize, buckets: 0, used: 0, free: 0, records: 0, came: 0, went: 0, area: 0 });
       const sizeClass = classes.get(key);
       bucket.sizeClass = sizeClass;
       sizeClass.area = Math.max(sizeClass.area, bucket.count * recSize);
@@ -139,12 +144,9 @@ class Pool {
       sizeClass.buckets += 1;
       sizeClass.used += bucket.used;
       sizeClass.free += bucket.free;
+      sizeClass.records += bucket.used + bucket.free;
     }
     return [...classes.values()].sort((a, b) => a.group - b.group || a.recSize - b.recSize);
-  }
-
-  sum(key) {
-    return this.buckets.reduce((sum, bucket) => sum + (bucket[key] ?? 0), 0);
   }
 }
 

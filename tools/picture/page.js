@@ -5,19 +5,20 @@ const lists = [];
 
 function makeHead() {
   const present = pools.filter((pool) => pool.change !== "went");
-  const sum = (items, key) => items.reduce((total, item) => total + item[key], 0);
-  const used = sum(present, "used"), free = sum(present, "free"), ext = sum(present, "presentExt");
-  const blocks = counted(sum(present, "presentBuckets"), "bucket") +
+  const used = sumOf(present, "used"), free = sumOf(present, "free"), ext = sumOf(present, "presentExt");
+  const blocks = counted(sumOf(present, "presentBuckets"), "bucket") +
     (ext > 0 ? ` and ${counted(ext, "ext record")}` : "");
-  const lines = [make("p", { class: "lead" }, `${counted(present.length, "pool")} with ${blocks}; ` +
-    `${formatNumber(used)} of ${counted(used + free, "record")} in use.`)];
+  const off = present.filter((pool) => pool.off).length;
+  const lines = [make("p", { class: "lead" }, counted(present.length, "pool"),
+    off > 0 && off === present.length ? " with pooling off." : (off > 0 ? ` (${formatNumber(off)} off)` : "") +
+      ` with ${blocks}; ${formatNumber(used)} of ${counted(used + free, "record")} in use.`)];
   if (isPair) {
-    const came = sum(pools, "came"), went = sum(pools, "went");
+    const came = sumOf(pools, "came"), went = sumOf(pools, "went");
     const ofBuckets = (change) => formatNumber(pools.flatMap((p) => p.buckets).filter((b) => b.change === change).length);
     lines.push(make("p", { class: "lead" }, `Since ${data.files[0]}: ${counted(came, "record")} came, ` +
       `${formatNumber(went)} went; ${ofBuckets("came")} buckets came, ${ofBuckets("went")} went.`));
   }
-  const faults = sum(pools, "numFaults");
+  const faults = sumOf(pools, "numFaults");
   if (faults > 0)
     lines.push(make("p", { class: "lead fault" }, `${counted(faults, "inconsistency", "inconsistencies")} in the text: see below.`));
   const file = data.files.at(-1) ?? "";
@@ -34,6 +35,14 @@ function makeSwatch(look, isHead) {
   return canvas;
 }
 
+function makeKeys() {
+  const keys = (names, does) => make("span", {}, ...names.flatMap((name) => [make("kbd", {}, name), " "]), does);
+  return make("p", { id: "keys", class: "quiet keys" }, make("span", {}, "Keys in a list:"),
+    keys(["←", "→", "↑", "↓"], "move"), keys(["Home", "End"], "ends of a bucket"),
+    keys(["PgUp", "PgDn"], "ten rows"), keys(["Enter"], "unfold"),
+    keys(["h"], "served next"), keys(["n"], "next free one"), keys(["d"], "next damaged"), keys(["Esc"], "leave"));
+}
+
 function makeGuide() {
   const kinds = [["used", isPair ? "used, as before" : "used"], ["free", "free"], ["free", "served next", true]];
   if (isPair) kinds.push(["came", "came into use"], ["went", "freed"]);
@@ -48,7 +57,10 @@ function makeGuide() {
     },
   }, make("option", { value: "" }, "Go to pool"), ...pools.map((pool) => make("option", { value: pool.index }, pool.label)));
   const guide = document.getElementById("guide");
-  guide.append(legend);
+  if (pools.some((pool) => pool.buckets.length > 0)) {
+    document.getElementById("head").append(makeKeys());
+    guide.append(legend);
+  }
   if (pools.length > 1) guide.append(select);
 }
 
@@ -67,10 +79,9 @@ function makeOverview() {
     numberColumn("Ext", "presentExt", "ext records"), numberColumn("Buckets", "presentBuckets"),
     numberColumn("Bytes held", "held", "heap blocks with their headers"),
     numberColumn("Payload", "payload", "data bytes of used records"),
-    { title: "Share", kind: "number", about: "payload of what is held",
-      key: (pool) => pool.payload / Math.max(1, pool.held),
-      show: (pool) => (pool.held === 0 ? "–" : formatPercent((pool.payload * 100) / pool.held)) },
-    { title: "", key: (pool) => pool.held, show: (pool) => {
+    shareColumn("payload of what is held", "payload", "held"),
+    { title: "Payload in bytes held", show: (pool) => {
+      if (pool.held === 0) return "";
       const outer = makeBar(pool.held / held, "held");
       outer.firstChild.append(makeBar(pool.payload / Math.max(1, pool.held)));
       return outer;
@@ -83,10 +94,11 @@ function makeHistogram(pool) {
   const peak = largest(pool.histogram, (row) => row[1]);
   const columns = [
     { title: "Size", kind: "number", about: "bytes of data", key: (row) => row[0], show: (row) => formatNumber(row[0]) },
-    { title: "Records", kind: "number", key: (row) => row[1], show: (row) => formatNumber(row[1]) },
+    numberColumn("Records", 1),
     ...(isPair ? [{ title: "Change", kind: "number", key: (row) => row[1] - row[2],
-      show: (row) => makeChange(Math.abs(row[1] - row[2]), row[1] > row[2] ? "came" : "went") }] : []),
-    { title: "", key: (row) => row[1], show: (row) => makeBar(row[1] / peak) },
+      show: (row) => makeDifference(row[1], row[2]),
+      total: (rows) => makeDifference(sumOf(rows, 1), sumOf(rows, 2)) }] : []),
+    { title: "Records, to scale", show: (row) => makeBar(row[1] / peak) },
   ];
   return make("div", { class: "panel" }, make("h3", {}, "Records in use by size"),
     makeTable(`Records of ${pool.label} in use by size`, columns, pool.histogram));
@@ -109,10 +121,8 @@ function makeClasses(pool, list) {
       return button;
     } },
     numberColumn("Buckets", "buckets"), numberColumn("Used", "used"), numberColumn("Free", "free"), ...changeColumns(),
-    { title: "Share", kind: "number", about: "records in use", key: (c) => c.used / Math.max(1, c.used + c.free),
-      show: (c) => (c.used + c.free === 0 ? "–" : formatPercent((c.used * 100) / (c.used + c.free))) },
-    { title: "", key: (c) => c.used / Math.max(1, c.used + c.free),
-      show: (c) => makeBar(c.used / Math.max(1, c.used + c.free), "whole") },
+    shareColumn("records in use", "used", "records"),
+    { title: "Used of all records", show: (c) => makeBar(c.used / Math.max(1, c.records), "whole") },
   ];
   table.append(make("h3", {}, "Size classes"), makeTable(`Size classes of ${pool.label}`, columns, pool.classes));
   return table;
@@ -146,13 +156,14 @@ function makeExt(pool) {
 
 function makeSection(pool) {
   const list = new BucketList(pool);
+  const numClasses = pool.classes.filter((sizeClass) => sizeClass.buckets > 0).length;
   const header = make("dl", { class: "header" }, ...pool.header.map(([label, value]) =>
     make("div", {}, make("dt", {}, label), make("dd", {}, value))));
   pool.section = make("section", { id: `pool-${pool.index}`, class: pool.change },
     make("h2", {}, pool.label, ...marksOf(pool).map((mark) => make("span", { class: `${mark} badge` }, mark))),
     make("p", { class: "lead" }, pool.buckets.length === 0 ?
       pool.off ? "Pooling is off: requests go to the heap." : "No buckets." :
-      `${counted(pool.presentBuckets, "bucket")} of ${counted(pool.classes.length, "size class", "size classes")}, ` +
+      `${counted(pool.presentBuckets, "bucket")} of ${counted(numClasses, "size class", "size classes")}, ` +
       `${formatNumber(pool.used)} of ${counted(pool.used + pool.free, "record")} in use.`),
     makeFaults(pool));
   if (pool.histogram.length > 0)
@@ -162,7 +173,7 @@ function makeSection(pool) {
     pool.section.append(make("div", { class: "panels" }, makeClasses(pool, list)));
   pool.section.append(...[makeExt(pool), makeDetails("Header block", header)].filter((part) => part !== null));
   if (pool.buckets.length > 0) {
-    pool.section.append(make("h3", {}, "Buckets"), list.element);
+    pool.section.append(make("h3", {}, "Buckets", list.turn), list.element);
     lists.push(list);
   }
   return pool.section;
@@ -188,10 +199,7 @@ function renderSoon() {
 makeHead();
 makeGuide();
 document.getElementById("pools").replaceChildren(
-  ...(pools.length > 1 ? [makeOverview()] : []), ...pools.map(makeSection),
-  make("p", { id: "keys", class: "quiet keys" }, "In a list of buckets: arrows, Home, End and Page keys move from ",
-    "record to record, ", make("kbd", {}, "h"), " to the one that is served next, ", make("kbd", {}, "n"),
-    " from a free record to its next, ", make("kbd", {}, "d"), " to the next damaged one."));
+  ...(pools.length > 1 ? [makeOverview()] : []), ...pools.map(makeSection));
 redraw();
 window.addEventListener("scroll", renderSoon, { passive: true });
 window.addEventListener("resize", redraw);

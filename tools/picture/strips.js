@@ -1,71 +1,9 @@
-// The buckets of a pool, each a row with a strip of its records. Of thousands of rows only those in
-// view are elements; their strips are canvases, drawn when they come into view.
+// The buckets of a pool, each a row with a strip of its records; many share a row that unfolds. Of
+// thousands of rows only those in view are elements; their strips are canvases, drawn when they come
+// into view.
 "use strict";
 
-const rowMetrics = { heading: 40, pad: 3, text: 22, narrow: 720, over: 400 };
-
-/** What the page says of a record: at the pointer, at the cursor, and aloud. */
-const tip = {
-  element: document.getElementById("tip"),
-  spoken: document.getElementById("spoken"),
-
-  /** Shows a record beside its cell; `box` is the cell's place in the window. */
-  show(bucket, record, box) {
-    this.element.replaceChildren(...describe(bucket, record));
-    this.element.hidden = false;
-    const { offsetWidth: width, offsetHeight: height } = this.element;
-    const left = Math.min(box.left + box.width / 2 - width / 2, document.documentElement.clientWidth - width - 8);
-    const isBelow = box.bottom + height + 12 < window.innerHeight;
-    this.element.style.left = `${Math.max(8, left)}px`;
-    this.element.style.top = `${isBelow ? box.bottom + 8 : box.top - height - 8}px`;
-  },
-
-  hide() {
-    this.element.hidden = true;
-  },
-
-  speak(bucket, record) {
-    const parts = describe(bucket, record).flatMap((part) =>
-      part.tagName === "DL" ? [...part.children].map((pair) => [...pair.children].map((e) => e.textContent).join(" "))
-        : [part.textContent]);
-    this.spoken.textContent = `Bucket ${bucket.id}: ${parts.join(", ")}`;
-  },
-};
-
-function titleOf(bucket, record) {
-  const type = bucket.unpacked.type[record];
-  const was = bucket.unpacked.before[record] === 1;
-  if (lookOf(bucket, record) === "damaged") return "Damaged";
-  if (bucket.change === "went") return type === Type.used ? "Went with its bucket" : "Free, its bucket went";
-  if (type === Type.used) return !isPair ? "In use" : was ? "In use, as before" : "Came into use";
-  const served = bucket.isHead(record) ? ", served next" : "";
-  return `${isPair && was ? "Freed" : "Free"}${served}`;
-}
-
-/** The elements that describe a record. */
-function describe(bucket, record) {
-  const { type, next } = bucket.unpacked;
-  const offset = bucket.offsetOf(record);
-  const fact = (name, value) => make("div", {}, make("dt", {}, name), make("dd", {}, value));
-  const facts = [
-    fact("type", typeNames[type[record]]),
-    fact("offset", `${offset} to ${offset + bucket.recSize}`),
-    fact(type[record] === Type.free ? "room" : "data", counted(bucket.dataSize, "byte")),
-  ];
-  if (type[record] === Type.free) {
-    const at = bucket.recordAt(next[record]);
-    const place = next[record] === 0 ? "none, the list ends" : at < 0 ? `${next[record]}, no record` :
-      `${next[record]} (record ${at + 1})`;
-    facts.push(fact("next", place));
-  }
-  facts.push(fact("address", bucket.addressOf(record)));
-  return [
-    make("strong", {}, titleOf(bucket, record)),
-    make("span", { class: "quiet" }, `record ${record + 1} of ${bucket.count}`),
-    make("dl", {}, ...facts),
-    ...bucket.faultsOf(record).map((fault) => make("p", { class: "fault" }, `line ${fault.line}: ${fault.text}`)),
-  ];
-}
+const rowMetrics = { fold: 28, pad: 3, text: 22, narrow: 720, over: 400 };
 
 const bucketColumns = [
   { title: "Id", kind: "number", key: (b) => b.id, show: (b) => `${b.id}` },
@@ -78,13 +16,15 @@ const bucketColumns = [
   { title: "Address", key: (b) => b.addr.padStart(16, "0"), show: (b) => `0x${b.addr}` },
 ];
 
+/** A place in a list is an item, which is a bucket or a fold, and a record of the bucket. */
 class BucketList {
   constructor(pool) {
     this.pool = pool;
+    this.folds = foldsOf(pool);
     this.sizeClass = null; // the one that is shown alone
     this.sort = { column: bucketColumns[0], isDescending: false };
     this.rows = new Map(); // by place in this.items
-    this.cursor = null; // the record at the keyboard's focus, as this.pointed is that at the pointer
+    this.cursor = null; // the place at the keyboard's focus, as this.pointed is that at the pointer
     this.pointed = null;
     this.head = make("div", { class: "row head", role: "row" });
     this.body = make("div", {
@@ -98,30 +38,28 @@ class BucketList {
       click: (event) => this.tap(event),
     });
     this.element = make("div", { class: "list" }, this.head, this.body);
+    this.turn = make("button", { type: "button", class: "turn", click: () => this.turnAll() });
     this.arrange();
   }
 
   /** Shows one size class alone, or all of them for null. */
   filter(sizeClass) {
     this.sizeClass = sizeClass;
+    for (const fold of this.folds) if (fold.sizeClass === sizeClass) fold.isOpen = true;
     this.arrange();
     this.layOut();
   }
 
-  /** Brings the buckets into their order; in that of the report each size class has a heading. */
+  /** Brings the buckets into their order. That of the report is the one in which they share rows. */
   arrange() {
     const { column, isDescending } = this.sort;
-    const buckets = this.pool.buckets.filter((b) => this.sizeClass === null || b.sizeClass === this.sizeClass);
-    const byReport = column === bucketColumns[0] && !isDescending;
-    const places = new Map(this.pool.classes.map((sizeClass, i) => [sizeClass, i]));
-    buckets.sort(compareBy(column.key, isDescending));
-    if (byReport) buckets.sort(compareBy((b) => places.get(b.sizeClass), false));
-    this.items = [];
-    for (const bucket of buckets) {
-      if (byReport && this.items.at(-1)?.bucket.sizeClass !== bucket.sizeClass)
-        this.items.push({ bucket, isHeading: true });
-      this.items.push({ bucket, isHeading: false });
-    }
+    const folds = this.folds.filter((fold) => this.sizeClass === null || fold.sizeClass === this.sizeClass);
+    this.buckets = folds.flatMap((fold) => fold.buckets);
+    this.isFolded = column === bucketColumns[0] && !isDescending;
+    if (!this.isFolded) this.buckets.sort(compareBy(column.key, isDescending));
+    this.items = this.isFolded ? folds.flatMap((fold) => fold.rows) : this.buckets;
+    this.turn.hidden = !this.isFolded;
+    this.turn.replaceChildren(this.isClosed ? "unfold all" : "fold all");
     const press = (pressedColumn) => {
       this.sort = pressed(this.sort, pressedColumn);
       this.arrange();
@@ -143,18 +81,43 @@ class BucketList {
     let top = 0;
     for (const item of this.items) {
       this.tops.push(top);
-      top += item.isHeading ? rowMetrics.heading : this.heightOf(item.bucket);
+      top += this.heightOf(item);
     }
     this.body.style.height = `${top}px`;
-    this.height = top;
     this.clear();
     this.render();
   }
 
-  heightOf(bucket) {
-    const { perLine } = this.gridOf(bucket);
-    const lines = Math.max(1, Math.ceil(bucket.count / perLine));
-    return lines * cellMetrics.line + 2 * rowMetrics.pad + (this.isNarrow ? rowMetrics.text : 0);
+  /** Opens all folds if one of them is closed, and else closes them. */
+  turnAll() {
+    const isOpen = this.isClosed;
+    for (const fold of this.allFolds) fold.isOpen = isOpen;
+    this.arrange();
+    this.layOut();
+  }
+
+  get allFolds() {
+    return this.folds.flatMap((fold) => [fold, ...fold.parts.filter((part) => part instanceof Fold)]);
+  }
+
+  get isClosed() {
+    return this.allFolds.some((fold) => !fold.isOpen);
+  }
+
+  toggle(fold) {
+    fold.isOpen = !fold.isOpen;
+    this.arrange();
+    this.layOut();
+  }
+
+  heightOf(item) {
+    const text = this.isNarrow ? rowMetrics.text : 0;
+    if (item instanceof Fold) return rowMetrics.fold + text;
+    return this.linesOf(item) * cellMetrics.line + 2 * rowMetrics.pad + text;
+  }
+
+  linesOf(bucket) {
+    return Math.max(1, Math.ceil(bucket.count / this.gridOf(bucket).perLine));
   }
 
   /** The width of a bucket's cells and their number in a line. Cells of a pool are to scale, in whole
@@ -201,50 +164,58 @@ class BucketList {
     return Math.max(0, low - 1);
   }
 
-  makeRow({ bucket, isHeading }) {
-    if (isHeading) {
-      const { dataSize, buckets, used, free } = bucket.sizeClass;
-      return make("div", { class: "row class" }, make("strong", {}, counted(dataSize, "byte")),
-        make("span", { class: "quiet" }, `${counted(buckets, "bucket")}, ${formatNumber(used)} of ` +
-          `${counted(used + free, "record")} in use`));
-    }
-    const canvas = make("canvas");
-    const row = make("div", { class: `row ${bucket.change}` },
-      ...bucketColumns.map((column) => make("span", { class: column.kind ?? null }, column.show(bucket))), canvas);
-    if (bucket.change !== "")
-      row.children[0].prepend(make("span", { class: `${bucket.change} sign` }, bucket.change === "came" ? "+ " : "− "));
-    row.bucket = bucket;
+  makeRow(item) {
+    if (item instanceof Fold) return this.makeFold(item);
+    const row = make("div", { class: `row ${item.change}` },
+      ...bucketColumns.map((column) => make("span", { class: column.kind ?? null }, column.show(item))), make("canvas"));
+    if (item.change !== "")
+      row.children[0].prepend(make("span", { class: `${item.change} sign` }, item.change === "came" ? "+ " : "− "));
+    row.item = item;
     this.paint(row);
     return row;
   }
 
+  makeFold(fold) {
+    const row = make("div", { class: "row fold" }, make("span", { class: "title" }, make("span", { class: "arrow" }, fold.isOpen ? "▾" : "▸"), ` ${fold.title} `,
+      make("span", { class: "quiet" }, fold.about)),
+    make("span", { class: "share" }, makeBar(fold.used / Math.max(1, fold.total), "whole"),
+      ...fold.captions.map(([kind, text]) => make("span", { class: kind }, text))));
+    row.classList.toggle("class", fold.sizeClass !== undefined);
+    row.classList.toggle("current", this.cursor?.item === fold);
+    row.item = fold;
+    return row;
+  }
+
   paint(row) {
-    const { bucket } = row;
+    const bucket = row.item;
     const { width, perLine } = this.gridOf(bucket);
-    const lines = Math.max(1, Math.ceil(bucket.count / perLine));
     const { side } = cellMetrics; // room for a frame around the outer cells
-    const context = prepareCanvas(row.querySelector("canvas"), this.strip + 2 * side, lines * cellMetrics.line);
+    const context = prepareCanvas(row.querySelector("canvas"), this.strip + 2 * side,
+      this.linesOf(bucket) * cellMetrics.line);
     context.translate(side, 0);
     const place = (record) => [(record % perLine) * width, Math.floor(record / perLine) * cellMetrics.line, width];
     for (let i = 0; i < bucket.count; ++i)
       paintCell(context, lookOf(bucket, i), bucket.isHead(i), ...place(i));
     for (const marked of [this.pointed, this.cursor]) {
-      if (marked?.bucket !== bucket) continue;
+      if (marked?.item !== bucket) continue;
       const next = bucket.recordAt(bucket.unpacked.next[marked.record]);
       if (next >= 0) paintFrame(context, true, ...place(next));
       paintFrame(context, false, ...place(marked.record));
     }
   }
 
-  repaint(bucket) {
-    for (const row of this.rows.values()) if (row.bucket === bucket) this.paint(row);
+  repaint(item) {
+    for (const row of this.rows.values())
+      if (row.item !== item) continue;
+      else if (item instanceof Fold) row.classList.toggle("current", this.cursor?.item === item);
+      else this.paint(row);
   }
 
-  /** The place of a record's cell in the window. */
-  boxOf({ bucket, record }) {
-    const row = [...this.rows.values()].find((r) => r.bucket === bucket);
-    if (row === undefined) return null;
-    const { width, perLine } = this.gridOf(bucket);
+  /** The place of a record's cell in the window, null for a fold and for what isn't in view. */
+  boxOf({ item, record }) {
+    const row = [...this.rows.values()].find((r) => r.item === item);
+    if (row === undefined || item instanceof Fold) return null;
+    const { width, perLine } = this.gridOf(item);
     const box = row.querySelector("canvas").getBoundingClientRect();
     const left = box.left + cellMetrics.side + (record % perLine) * width;
     const top = box.top + Math.floor(record / perLine) * cellMetrics.line;
@@ -253,21 +224,21 @@ class BucketList {
 
   /** The record under the pointer, null for none. */
   under(event) {
-    const bucket = event.target.tagName === "CANVAS" ? event.target.closest(".row").bucket : null;
-    if (bucket === null) return null;
-    const { width, perLine } = this.gridOf(bucket);
+    if (event.target.tagName !== "CANVAS") return null;
+    const { item } = event.target.closest(".row");
+    const { width, perLine } = this.gridOf(item);
     const column = Math.floor((event.offsetX - cellMetrics.side) / width);
     const record = Math.floor(event.offsetY / cellMetrics.line) * perLine + column;
-    return column >= 0 && column < perLine && record >= 0 && record < bucket.count ? { bucket, record } : null;
+    return column >= 0 && column < perLine && record >= 0 && record < item.count ? { item, record } : null;
   }
 
   /** Moves one of the two marks, and shows the record at the last one. */
   mark(which, place) {
     const old = this[which];
-    if (old?.bucket === place?.bucket && old?.record === place?.record) return;
+    if (old?.item === place?.item && old?.record === place?.record) return;
     this[which] = place;
-    if (old !== null && old.bucket !== place?.bucket) this.repaint(old.bucket);
-    if (place !== null) this.repaint(place.bucket);
+    if (old !== null && old.item !== place?.item) this.repaint(old.item);
+    if (place !== null) this.repaint(place.item);
     this.showTip();
   }
 
@@ -275,7 +246,7 @@ class BucketList {
     const shown = this.pointed ?? (document.activeElement === this.body ? this.cursor : null);
     const box = shown === null ? null : this.boxOf(shown);
     if (box === null) tip.hide();
-    else tip.show(shown.bucket, shown.record, box);
+    else tip.show(shown.item, shown.record, box);
   }
 
   point(event) {
@@ -290,102 +261,122 @@ class BucketList {
 
   tap(event) {
     this.body.focus({ preventScroll: true });
-    this.mark("cursor", this.under(event));
+    const item = event.target.closest(".row")?.item;
+    if (item instanceof Fold) this.toggle(item);
+    this.mark("cursor", item instanceof Fold ? { item, record: 0 } : this.under(event));
   }
 
   enter() {
     if (!this.body.matches(":focus-visible")) return;
     const start = this.cursor ?? this.firstInView();
-    if (start !== null) this.go(start.bucket, start.record);
+    if (start !== null) this.go(start.item, start.record);
   }
 
   /** Where the cursor begins. */
   firstInView() {
     const top = this.head.getBoundingClientRect().bottom - this.body.getBoundingClientRect().top;
-    const item = this.items.find(({ isHeading }, i) => !isHeading && this.tops[i] >= top);
-    return item === undefined ? null : { bucket: item.bucket, record: 0 };
+    const item = this.items.find((_, i) => this.tops[i] >= top);
+    return item === undefined ? null : { item, record: 0 };
   }
 
   leave() {
     const old = this.cursor;
     this.cursor = null;
-    if (old !== null) this.repaint(old.bucket);
+    if (old !== null) this.repaint(old.item);
     tip.hide();
   }
 
-  /** Puts the cursor on a record and brings it into view. */
-  go(bucket, record) {
-    const i = this.items.findIndex((item) => !item.isHeading && item.bucket === bucket);
+  /** Puts the cursor on a place, unfolds it and brings it into view. */
+  go(item, record) {
+    if (!this.items.includes(item)) {
+      for (let { fold } = item; fold !== undefined; { fold } = fold) fold.isOpen = true;
+      this.arrange();
+      this.layOut();
+    }
     const box = this.body.getBoundingClientRect();
-    const top = box.top + this.tops[i], bottom = top + this.heightOf(bucket);
+    const top = box.top + this.tops[this.items.indexOf(item)], bottom = top + this.heightOf(item);
     const margin = 120; // for what sticks to the window's top, and for the tip
     if (top < margin || bottom > window.innerHeight - margin)
       window.scrollBy({ top: top - window.innerHeight / 2, behavior: "instant" });
     this.render();
-    this.mark("cursor", { bucket, record });
-    tip.speak(bucket, record);
+    this.mark("cursor", { item, record });
+    tip.speak(item, record);
   }
 
   press(event) {
     if (event.ctrlKey || event.altKey || event.metaKey || event.target !== this.body) return;
     if (event.key === "Escape") return this.mark("cursor", null);
     const start = this.cursor ?? this.firstInView();
-    const target = start === null ? null : this.targetOf(event.key, start);
+    if (start === null) return;
+    const fold = start.item instanceof Fold ? start.item : this.isFolded ? start.item.fold : null;
+    if (event.key === "Enter" || event.key === " ") {
+      event.preventDefault();
+      if (fold === null) return;
+      this.toggle(fold);
+      return this.go(fold, 0);
+    }
+    const target = this.targetOf(event.key, start);
     if (target === null) return;
     event.preventDefault();
     this.unpoint();
-    this.go(target.bucket, target.record);
+    this.go(target.item, target.record);
   }
 
-  /** The record that a key leads to from a place, null if it leads to none. */
-  targetOf(key, { bucket, record }) {
-    const stay = { bucket, record };
-    const within = (to) => ({ bucket, record: Math.min(Math.max(to, 0), bucket.count - 1) });
+  /** The place that a key leads to, null for other keys. */
+  targetOf(key, { item, record }) {
     switch (key) {
-      case "ArrowLeft": return within(record - 1);
-      case "ArrowRight": return within(record + 1);
-      case "Home": return within(0);
-      case "End": return within(bucket.count - 1);
-      case "ArrowUp": return this.beside(stay, -1);
-      case "ArrowDown": return this.beside(stay, 1);
-      case "PageUp": return this.beside(stay, -10);
-      case "PageDown": return this.beside(stay, 10);
-      case "n": return this.orStay(stay, bucket.recordAt(bucket.unpacked.next[record]));
-      case "h": return this.orStay(stay, bucket.recordAt(bucket.head));
-      case "d": return this.damagedAfter(stay);
+      case "ArrowUp": return this.beside(item, record, -1);
+      case "ArrowDown": return this.beside(item, record, 1);
+      case "PageUp": return this.beside(item, record, -10);
+      case "PageDown": return this.beside(item, record, 10);
+      case "d": return this.damagedAfter(item, record);
+      default: return item instanceof Fold ? null : this.within(key, item, record);
+    }
+  }
+
+  /** The record of the same bucket that a key leads to, null for other keys. */
+  within(key, bucket, record) {
+    const at = (to) => ({ item: bucket, record: Math.min(Math.max(to, 0), bucket.count - 1) });
+    const atOffset = (offset) => {
+      const to = bucket.recordAt(offset);
+      return at(to < 0 ? record : to);
+    };
+    switch (key) {
+      case "ArrowLeft": return at(record - 1);
+      case "ArrowRight": return at(record + 1);
+      case "Home": return at(0);
+      case "End": return at(bucket.count - 1);
+      case "n": return atOffset(bucket.unpacked.next[record]);
+      case "h": return atOffset(bucket.head);
       default: return null;
     }
   }
 
-  orStay(stay, record) {
-    return record < 0 ? stay : { bucket: stay.bucket, record };
-  }
-
-  /** A line further up or down, or in another bucket the record nearest in its place. */
-  beside({ bucket, record }, step) {
-    const { perLine, width } = this.gridOf(bucket);
+  /** A line further up or down, or in another row the record nearest in its place. */
+  beside(item, record, step) {
+    const { perLine, width } = item instanceof Fold ? { perLine: 1, width: 0 } : this.gridOf(item);
     const onLine = record + step * perLine;
-    if (Math.abs(step) === 1 && onLine >= 0 && onLine < bucket.count) return { bucket, record: onLine };
-    const buckets = this.items.filter((item) => !item.isHeading).map((item) => item.bucket);
-    const at = buckets.indexOf(bucket);
-    const other = buckets[Math.min(Math.max(at + step, 0), buckets.length - 1)];
-    if (other === bucket || other.count === 0) return { bucket, record };
+    if (Math.abs(step) === 1 && onLine >= 0 && onLine < item.count) return { item, record: onLine };
+    const at = this.items.indexOf(item);
+    const other = this.items[Math.min(Math.max(at + step, 0), this.items.length - 1)];
+    if (other === item || other.count === 0) return { item, record };
+    if (other instanceof Fold) return { item: other, record: 0 };
     const grid = this.gridOf(other);
     const column = Math.min(Math.floor(((record % perLine) + 0.5) * width / grid.width), grid.perLine - 1);
     const lastLine = Math.floor((other.count - 1) / grid.perLine);
     const line = step > 0 ? 0 : lastLine;
-    return { bucket: other, record: Math.min(line * grid.perLine + column, other.count - 1) };
+    return { item: other, record: Math.min(line * grid.perLine + column, other.count - 1) };
   }
 
-  damagedAfter({ bucket, record }) {
-    const buckets = this.items.filter((item) => !item.isHeading).map((item) => item.bucket);
-    const at = buckets.indexOf(bucket);
-    for (let i = 0; i <= buckets.length; ++i) {
-      const other = buckets[(at + i) % buckets.length];
-      if (other.damaged === "") continue;
-      const found = other.unpacked.damaged.indexOf(1, i === 0 ? record + 1 : 0);
-      if (found >= 0) return { bucket: other, record: found };
+  damagedAfter(item, record) {
+    const isFold = item instanceof Fold;
+    const at = Math.max(0, this.buckets.indexOf(isFold ? item.buckets[0] : item));
+    for (let i = 0; i <= this.buckets.length; ++i) {
+      const bucket = this.buckets[(at + i) % this.buckets.length];
+      if (bucket.damaged === "") continue;
+      const found = bucket.unpacked.damaged.indexOf(1, i === 0 && !isFold ? record + 1 : 0);
+      if (found >= 0) return { item: bucket, record: found };
     }
-    return { bucket, record };
+    return { item, record };
   }
 }

@@ -22,8 +22,8 @@ const largest = (items, keyOf) => items.reduce((most, item) => Math.max(most, ke
 
 /** A bar of `share` from 0 to 1. */
 function makeBar(share, kind = "") {
-  const fill = make("span");
-  fill.style.width = `${Math.min(1, Math.max(0, share)) * 100}%`;
+  const fill = share > 0 ? make("span") : null;
+  if (fill !== null) fill.style.width = `${Math.min(1, share) * 100}%`;
   return make("span", { class: `bar ${kind}`, "aria-hidden": "true" }, fill);
 }
 
@@ -32,6 +32,8 @@ function makeChange(number, kind) {
   if (number === 0) return make("span", { class: "quiet" }, "·");
   return make("span", { class: kind }, (kind === "came" ? "+" : "−") + formatNumber(number));
 }
+
+const makeDifference = (now, before) => makeChange(Math.abs(now - before), now > before ? "came" : "went");
 
 /** Sorts by a key; texts, numbers and hexadecimal texts of one width compare as they should. */
 function compareBy(keyOf, isDescending) {
@@ -44,6 +46,7 @@ function compareBy(keyOf, isDescending) {
 
 /** A heading that sorts by its column when it is pressed. `sort` is what the table is sorted by. */
 function makeSortHeading(name, column, sort, press) {
+  if (column.key === undefined) return make(name, { class: "quiet", scope: "col" }, column.title);
   const isSorted = sort.column === column;
   const arrow = isSorted ? (sort.isDescending ? "↓" : "↑") : "";
   const attributes = {
@@ -63,9 +66,9 @@ function pressed(sort, column) {
 }
 
 /**
- * A table of rows. A column has `title`, `kind` ("number" or none), `key` of a row to sort by, and
- * `show` for what a cell holds. A long table shows its first rows in the order chosen, and their
- * number.
+ * A table of rows. A column has `title`, `kind` ("number" or none), `key` of a row to sort by (none:
+ * it doesn't sort), `show` for what a cell holds, and `total` of all rows for the last row. A long
+ * table shows its first rows in the order chosen, and their number.
  */
 function makeTable(label, columns, rows, { most = 500, rowAttributes = () => ({}) } = {}) {
   const table = make("table", { "aria-label": label });
@@ -83,22 +86,40 @@ function makeTable(label, columns, rows, { most = 500, rowAttributes = () => ({}
     table.replaceChildren(
       make("thead", {}, make("tr", {}, ...columns.map((column) => makeSortHeading("th", column, sort, press)))),
       make("tbody", {}, ...body));
+    const foot = make("tfoot");
     if (rows.length > most)
-      table.append(make("tfoot", {}, make("tr", {}, make("td", { colspan: columns.length },
-        `the first ${formatNumber(most)} of ${formatNumber(rows.length)} rows`))));
+      foot.append(make("tr", {}, make("td", { class: "quiet", colspan: columns.length },
+        `the first ${formatNumber(most)} of ${formatNumber(rows.length)} rows`)));
+    if (rows.length > 1 && columns.some((column) => column.total !== undefined))
+      foot.append(make("tr", { class: "total" }, ...columns.map((column, i) =>
+        make("td", { class: column.kind ?? null }, i === 0 ? "Total" : column.total?.(rows) ?? ""))));
+    table.append(foot);
     if (focused >= 0) table.querySelectorAll("th button")[focused].focus();
   };
   fill();
   return make("div", { class: "scroll" }, table);
 }
 
-/** A column of numbers under a key of the rows. */
+/** A column of numbers under a key of the rows; what went counts in no total. */
 const numberColumn = (title, key, about) => ({
   title, about, kind: "number", key: (row) => row[key], show: (row) => formatNumber(row[key]),
+  total: (rows) => formatNumber(sumOf(rows.filter((row) => row.change !== "went"), key)),
 });
+
+/** A column of how much of `whole` is `part`. */
+const shareColumn = (about, part, whole) => {
+  const share = (items) => [sumOf(items, part), sumOf(items, whole)];
+  const show = ([ofPart, ofWhole]) => (ofWhole === 0 ? "–" : formatPercent((ofPart * 100) / ofWhole));
+  return {
+    title: "Share", kind: "number", about, key: (row) => row[part] / Math.max(1, row[whole]),
+    show: (row) => show(share([row])),
+    total: (rows) => show(share(rows.filter((row) => row.change !== "went"))),
+  };
+};
 
 /** The two columns of what changed, none where a single report is shown. */
 const changeColumns = () => (!isPair ? [] : ["came", "went"].map((kind) => ({
   title: kind === "came" ? "Came" : "Went",
   kind: "number", key: (row) => row[kind], show: (row) => makeChange(row[kind], kind),
+  total: (rows) => makeChange(sumOf(rows, kind), kind),
 })));
