@@ -1,8 +1,8 @@
 #!/usr/bin/env python3
 """The commands of gdb against what the process itself reports: attached, with a core file, and with
-damaged links.
+damaged links; and the pools and adaptors as values.
 
-usage: gdb_test.py VOKMEMPOOL POOL_CHILD
+usage: gdb_test.py VOKMEMPOOL POOL_CHILD ADAPTORS_CHILD
 """
 import json
 import os
@@ -38,7 +38,7 @@ def debug(*arguments, commands):
     words = [word for command in ("set width 0", f"source {SCRIPT}", *commands)
              for word in ("-ex", command)]
     output, errors, _ = run("gdb", "-nx", "-batch", *arguments, *words)
-    same("Traceback" in errors, False, errors)
+    same("Python" in output + errors, False, output + errors)
     return output, errors
 
 
@@ -87,17 +87,27 @@ def test_damage(reports, pid):
     """Of a running process, last."""
     bucket = next(report["bucketReports"][0] for report in reports if report["bucketReports"])
     address = int(bucket["header"]["addr"], 16)
-    output, errors = debug("-p", pid, commands=[
-        "mempool of 0", "mempool of", "mempool report none", "print *'(anonymous namespace)::ownState'.pools._M_impl._M_start[1]",
+    found = "".join(debug("-p", pid, commands=[
+        "mempool of 0", "mempool of", "mempool of missing", "mempool report", "mempool report none",
         f"set {{long}}{address + 8} = 1", "mempool list", f"set {{long}}{address + 8} = {address}",
-        "mempool list"])
-    for part, text in [(output, "0x0: in no pool\n"), (output, " = Mgr of 'b'\n"),
-                       (output, f"pool 'b': a link leads to 0x1\n"),
-                       (output, f"pool 'b': a link leads to {address:#x}\n"),
-                       (errors, "usage: mempool of ADDRESS"), (errors, "there is no pool 'none'")]:
-        same(text in part, True, f"{text}: {output}{errors}")
+        "mempool of 0", "python at = Layout(); first = at.fetch('entry', at.read_pointer(at.first))",
+        "python gdb.execute(f'set {{long}}{first.address + first.fields[\"next\"]} = 2')", "mempool list"]))
+    for text in ("0x0: in no pool", "usage: mempool of ADDRESS", "usage: mempool report NAME",
+                 'mempool: No symbol "missing" in current context.', "mempool: there is no pool 'none'",
+                 "pool 'b': a link leads to 0x1", f"pool 'b': a link leads to {address:#x}",
+                 "the list of pools: a link leads to 0x2"):
+        same(f"{text}\n" in found, True, f"{text}: {found}")
 
 
+def test_values():
+    output, _ = debug(sys.argv[3], commands=["run", "info locals"])
+    words = "Mgr", "Mgr", "Allocator<int>", "Resource", "Deleter<main()::Marked>", "Deleter<int []>"
+    threads = "ThreadPools", "ThreadAllocator<int>", "ThreadResource"
+    same(re.findall(" = (.* of .*)", output),
+         [f"{kind} of 'words'" for kind in words] + [f"{kind} of 'threads'" for kind in threads], output)
+
+
+test_values()
 with tempfile.TemporaryDirectory() as folder:
     os.chdir(folder)
     with open("output", "wb") as output:

@@ -13,6 +13,7 @@ import struct
 
 import gdb
 import gdb.printing
+import gdb.types
 
 FORMAT = 1
 # The fields of s/diagnostics/Layout.h, in its order.
@@ -43,7 +44,7 @@ class Layout:
 
     def __init__(self):
         try:
-            at = int(gdb.parse_and_eval("(unsigned long)&'VOK::MemPool::layout'"))
+            at = int(gdb.parse_and_eval("&'VOK::MemPool::layout'"))
         except gdb.error:
             raise gdb.GdbError("mempool: libVokMemPool isn't loaded, or is older than 1.1") from None
         head = memory(at, 32)
@@ -56,12 +57,13 @@ class Layout:
         self.pointer = "=I" if self.width == 4 else "=Q"
         self.first = self.read_pointer(at + 32 + self.width)
         at += 32 + 2 * self.width
-        self.structures = {}
-        for name, fields in STRUCTURES.items():
-            names = fields.split()
-            offsets = struct.unpack(f"={len(names)}I", memory(at, 4 * len(names)))
-            self.structures[name] = dict(zip(names, offsets))
-            at += 4 * len(names)
+        self.structures = {name: {} for name in STRUCTURES}
+        places = [(name, field) for name in STRUCTURES for field in STRUCTURES[name].split()]
+        offsets = memory(at, 4 * len(places))
+        if offsets is None:
+            raise gdb.GdbError("mempool: the library's description of its layout can't be read")
+        for (name, field), (offset,) in zip(places, struct.iter_unpack("=I", offsets)):
+            self.structures[name][field] = offset
 
     def read_pointer(self, address):
         data = memory(address, self.width)
@@ -72,6 +74,23 @@ class Layout:
         fields = self.structures[kind]
         data = memory(address, fields["size"])
         return None if data is None else Structure(self, fields, address, data)
+
+    def follow(self, kind, address, link, damages):
+        """The structures of a list; what stops before its end is added to the damages."""
+        seen = set()
+        while address != 0:
+            found = self.fetch(kind, address)
+            if found is None or address in seen:
+                damages.append(f"a link leads to {address:#x}")
+                return
+            seen.add(address)
+            yield found
+            address = found.pointer(link)
+
+    def entries(self, damages):
+        """The name of each pool, and its address."""
+        for entry in self.follow("entry", self.read_pointer(self.first), "next", damages):
+            yield text_at(entry.pointer("name")), entry.pointer("pool")
 
 
 class Structure:
@@ -129,18 +148,11 @@ class Pool:
             return
         self.is_off = self.body.byte("enabled") == 0
         self._read_classes()
-        self.exts = list(self._follow("extRec", self.body.pointer("extRecs"), "next"))
-
-    def _follow(self, kind, address, link):
-        seen = set()
-        while address != 0:
-            found = self.layout.fetch(kind, address)
-            if found is None or address in seen:
-                self.damages.append(f"a link leads to {address:#x}")
-                return
-            seen.add(address)
-            yield found
-            address = found.pointer(link)
+        for ext in layout.follow("extRec", self.body.pointer("extRecs"), "next", self.damages):
+            if ext.byte("type") != EXT:
+                self.damages.append(f"the ext record at {ext.end:#x} has another type")
+                break
+            self.exts.append(ext)
 
     def _read_classes(self):
         count, width = self.body.word("numGroups"), self.layout.width
@@ -153,11 +165,13 @@ class Pool:
             group = self.layout.fetch("group", address) if address else None
             if group is not None and group.pointer("owner") == self.address:
                 buckets = []
-                for header in self._follow("bucket", group.pointer("head1"), "next1"):
+                for header in self.layout.follow("bucket", group.pointer("head1"), "next1", self.damages):
                     if header.pointer("parent") != address:
                         self.damages.append(f"the bucket at {header.address:#x} has another parent")
                         break
                     buckets.append(Bucket(header))
+                    if header.half("freeRecs") > buckets[-1].total:
+                        self.damages.append(f"the bucket at {header.address:#x} has wrong counts")
                 if buckets:
                     self.classes.append((group.half("dataSize"), buckets))
             elif address:
@@ -208,17 +222,18 @@ class Pool:
 
 
 def all_pools():
-    """The pools by name."""
-    layout = Layout()
-    address, seen, pools = layout.read_pointer(layout.first), set(), []
-    while address != 0 and address not in seen:
-        entry = layout.fetch("entry", address)
-        if entry is None:
-            break
-        seen.add(address)
-        pools.append(Pool(layout, text_at(entry.pointer("name")), entry.pointer("pool")))
-        address = entry.pointer("next")
+    """The pools by name. What stops their list is printed at once."""
+    layout, damages = Layout(), []
+    pools = [Pool(layout, name, address) for name, address in layout.entries(damages)]
+    for damage in damages:
+        print(f"the list of pools: {damage}")
     return pools
+
+
+def print_damages(pools):
+    for pool in pools:
+        for damage in pool.damages:
+            print(f"pool '{pool.name}': {damage}")
 
 
 def text_at(address):
@@ -245,6 +260,9 @@ class MemPool(gdb.Command):
     def __init__(self):
         super().__init__("mempool", gdb.COMMAND_DATA, prefix=True)
 
+    def invoke(self, argument, from_tty):
+        gdb.execute("help mempool")
+
 
 class List(gdb.Command):
     """The pools by name, with their records, buckets and bytes of the heap."""
@@ -257,9 +275,7 @@ class List(gdb.Command):
         print_table(("pool", "used", "free", "ext", "buckets", "bytes held"),
                     [(pool.name + (" (off)" if pool.body and pool.is_off else ""), *pool.sums())
                      for pool in pools])
-        for pool in pools:
-            for damage in pool.damages:
-                print(f"pool '{pool.name}': {damage}")
+        print_damages(pools)
 
 
 class Report(gdb.Command):
@@ -269,6 +285,8 @@ class Report(gdb.Command):
         super().__init__("mempool report", gdb.COMMAND_DATA)
 
     def invoke(self, argument, from_tty):
+        if not argument:
+            raise gdb.GdbError("usage: mempool report NAME")
         pool = next((pool for pool in all_pools() if pool.name == argument), None)
         if pool is None:
             raise gdb.GdbError(f"mempool: there is no pool '{argument}'")
@@ -278,8 +296,7 @@ class Report(gdb.Command):
         print_table(("bytes", "used", "free", "buckets", "empty", "full"), rows)
         lengths = [ext.word("length") for ext in pool.exts]
         print(f"{len(lengths)} ext records of {sum(lengths)} bytes in all")
-        for damage in pool.damages:
-            print(damage)
+        print_damages([pool])
 
 
 class Of(gdb.Command):
@@ -291,48 +308,63 @@ class Of(gdb.Command):
     def invoke(self, argument, from_tty):
         if not argument:
             raise gdb.GdbError("usage: mempool of ADDRESS")
-        address = int(gdb.parse_and_eval(f"(unsigned long)({argument})"))
-        for pool in all_pools():
+        try:
+            address = int(gdb.parse_and_eval(argument).cast(gdb.lookup_type("unsigned long")))
+        except gdb.error as error:
+            raise gdb.GdbError(f"mempool: {error}") from None
+        pools = all_pools()
+        for pool in pools:
             lines = pool.find(address)
             if lines is not None:
                 print("\n".join(lines))
                 return
         print(f"{address:#x}: in no pool")
+        print_damages(pools)
+
+
+def name_of(mgr):
+    """The name of the pool of a handle, by the list of pools alone."""
+    address = int(mgr["bucketMgr"])
+    return next((f"'{name}'" for name, pool in Layout().entries([]) if pool == address), "no pool")
+
+
+def name_by_source(deleter):
+    mgr = gdb.lookup_type("VOK::MemPool::Mgr").pointer()
+    return name_of((deleter["source"]["word"] & ~1).cast(mgr))  # bit 0 is a mark
+
+
+def name_of_threads(pools):
+    name = pools["set"]["_M_ptr"]["name"]["_M_dataplus"]["_M_p"]
+    return f"'{name.string(errors='replace')}'"
 
 
 class Printer:
-    """A value as its type and the name of its pool, which `path` leads to."""
+    """A value as its type and the name of its pool."""
 
-    def __init__(self, value, path):
-        self.value, self.path = value, path
+    def __init__(self, value, name):
+        self.value, self.name = value, name
 
     def to_string(self):
-        name = self.value.type.strip_typedefs().name.replace("VOK::MemPool::", "")
+        value = self.value
+        kind = gdb.types.get_basic_type(value.type).name.replace("VOK::MemPool::", "")
         try:
-            value = self.value
-            for field in self.path:
-                value = value[field]
-                if value.type.code == gdb.TYPE_CODE_PTR and field != "bucketMgr":
-                    value = value.dereference()
-            if self.path[-1] != "bucketMgr":
-                text = str(value).strip('"')
-                return f"{name} of '{text}'"
-            pool = next((pool for pool in all_pools() if pool.address == int(value)), None)
-        except (gdb.error, gdb.GdbError):
-            return name
-        return f"{name} of " + (f"'{pool.name}'" if pool else "no pool")
+            if value.type.code in (gdb.TYPE_CODE_REF, gdb.TYPE_CODE_RVALUE_REF):
+                value = value.referenced_value()
+            return f"{kind} of {self.name(value)}"
+        except (gdb.error, gdb.GdbError):  # optimised away, not constructed yet, or destroyed
+            return kind
 
 
 def printers():
     collection = gdb.printing.RegexpCollectionPrettyPrinter("libVokMemPool")
-    for name, pattern, path in (
-            ("Mgr", "Mgr", ("bucketMgr",)),
-            ("Mgr's adaptors", "(Allocator<.*>|Resource|Deleter<.*>)", ("mgr", "bucketMgr")),
-            ("ThreadPools", "ThreadPools", ("set", "_M_ptr", "name")),
-            ("ThreadPools' adaptors", "(ThreadAllocator<.*>|ThreadResource)",
-             ("pools", "set", "_M_ptr", "name"))):
-        collection.add_printer(name, f"^VOK::MemPool::{pattern}$",
-                               lambda value, path=path: Printer(value, path))
+    for pattern, name in (
+            ("Mgr", name_of),
+            ("Allocator<.*>|Resource", lambda value: name_of(value["mgr"])),
+            ("Deleter<.*>", name_by_source),
+            ("ThreadPools", name_of_threads),
+            ("ThreadAllocator<.*>|ThreadResource", lambda value: name_of_threads(value["pools"]))):
+        collection.add_printer(pattern, f"^VOK::MemPool::({pattern})$",
+                               lambda value, name=name: Printer(value, name))
     return collection
 
 
