@@ -5,6 +5,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <functional>
+#include <map>
 #include <string>
 #include <vector>
 
@@ -19,6 +20,11 @@ struct Memory {
   std::function<bool(std::uint64_t address, void* to, std::size_t size)> read;
   std::vector<Range> ranges; ///< those in which a module's data can be
   bool isChanging = false;   ///< the process may be running
+
+  /// The processor time of each thread that runs or waits for a processor, by the thread's number.
+  std::function<std::map<int, std::uint64_t>()> getRunnable = [] {
+    return std::map<int, std::uint64_t>();
+  };
 };
 
 /// A Failure says why there is nothing to read.

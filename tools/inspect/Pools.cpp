@@ -7,6 +7,7 @@
 #include <algorithm>
 #include <chrono>
 #include <iterator>
+#include <map>
 #include <thread>
 #include <utility>
 
@@ -90,22 +91,31 @@ bool IsSame(const Pool& a, const Pool& b) {
   return a.damages == b.damages && WriteReport(a.report) == WriteReport(b.report);
 }
 
+/// Whether a thread has waited for a processor all the time since its time was `before`.
+bool IsWaiting(const Memory& memory, const std::map<int, std::uint64_t>& before) {
+  return std::ranges::any_of(memory.getRunnable(), [&](const auto& thread) {
+    const auto found = before.find(thread.first);
+    return found != before.end() && found->second == thread.second;
+  });
+}
+
 /// What two passes agree on, or the last of four with false. A damage can be the state within an
-/// operation, and the process may wait for a processor in it: so four passes over some time have to
-/// agree on one.
+/// operation: so four passes over some time have to agree on one, and a thread that gets no
+/// processor meanwhile may be in the midst of one.
 template <class Read>
-auto ReadAgreed(Read read) {
+auto ReadAgreed(const Memory& memory, Read read) {
   constexpr int most = 3;
   int numSame = 0;
+  const auto before = memory.getRunnable();
   auto result = read();
   for (int i = 0; i < most; ++i) {
     if (!result.damages.empty()) std::this_thread::sleep_for(std::chrono::milliseconds(100));
     auto again = read();
     numSame = IsSame(result, again) ? numSame + 1 : 0;
     result = std::move(again);
-    if (numSame > 0 && (result.damages.empty() || numSame == most)) return std::pair(result, true);
+    if (numSame > 0 && result.damages.empty()) return std::pair(result, true);
   }
-  return std::pair(result, false);
+  return std::pair(result, numSame == most && !IsWaiting(memory, before));
 }
 
 class LibraryWalk {
@@ -126,13 +136,13 @@ public:
 private:
   std::pair<Registry, bool> ReadRegistry() const {
     const auto read = [&] { return RegistryWalk(library).Run(); };
-    return isChanging ? ReadAgreed(read) : std::pair(read(), true);
+    return isChanging ? ReadAgreed(library.memory, read) : std::pair(read(), true);
   }
 
   Pool ReadPool(const PoolPlace& entry) const {
     const auto read = [&] { return WalkPool(library, entry.pool, entry.name, detailed); };
     if (!isChanging) return read();
-    auto [pool, isAgreed] = ReadAgreed(read);
+    auto [pool, isAgreed] = ReadAgreed(library.memory, read);
     pool.isMoving = !isAgreed;
     return pool;
   }

@@ -56,6 +56,29 @@ std::vector<Memory::Range> FindModules(int process) {
   return ranges;
 }
 
+std::filesystem::path ThreadsOf(int process) { return fmt::format("/proc/{}/task", process); }
+
+/// By clock ticks. A thread that ends meanwhile is left out.
+std::map<int, std::uint64_t> FindRunnable(int process) {
+  std::map<int, std::uint64_t> times;
+  std::error_code ended;
+  for (const auto& thread : std::filesystem::directory_iterator(ThreadsOf(process), ended)) {
+    std::ifstream file(thread.path() / "stat");
+    std::string line;
+    std::getline(file, line);
+    // After the name, which may hold anything: the state, 10 fields, the times of user and system.
+    std::istringstream fields(line.substr(line.rfind(')') + 1));
+    std::string state, other;
+    fields >> state;
+    for (int i = 0; i < 10; ++i)
+      fields >> other;
+    std::uint64_t user = 0, system = 0;
+    if (fields >> user >> system && state == "R")
+      times[std::stoi(thread.path().filename())] = user + system;
+  }
+  return times;
+}
+
 } // namespace
 
 Memory MemoryOfProcess(int process) {
@@ -67,16 +90,15 @@ Memory MemoryOfProcess(int process) {
     if (copied < 0 && errno != EFAULT && errno != EIO) Refuse(errno);
     return copied == static_cast<ssize_t>(size);
   };
-  return {read, FindModules(process), true};
+  return {read, FindModules(process), true, [process] { return FindRunnable(process); }};
 }
 
 // Threads can start while others are being stopped, until none that runs is left.
 Freeze::Freeze(int process) {
-  const std::filesystem::path folder = fmt::format("/proc/{}/task", process);
   try {
     for (bool isComplete = false; !isComplete;) {
       isComplete = true;
-      for (const auto& entry : std::filesystem::directory_iterator(folder))
+      for (const auto& entry : std::filesystem::directory_iterator(ThreadsOf(process)))
         if (Stop(std::stoi(entry.path().filename()))) isComplete = false;
     }
   } catch (const std::filesystem::filesystem_error& error) {
