@@ -5,7 +5,6 @@
 #include "chart/Series.h"
 #include "picture/Data.h"
 #include "report/Check.h"
-#include "report/Difference.h"
 #include "report/Formats.h"
 #include "report/Summary.h"
 

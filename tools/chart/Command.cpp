@@ -7,7 +7,6 @@
 #include "report/Formats.h"
 
 #include <CLI/CLI.hpp>
-#include <filesystem>
 #include <fmt/format.h>
 #include <memory>
 
@@ -61,13 +60,7 @@ void Run(const Options& options) {
   const Series series = found.reports.empty() ? SeriesOfTrace(text) : SeriesOf(found.reports);
   if (series.pools.empty())
     throw Failure(fmt::format("{}: there is neither a report nor a trace line in it", name));
-  const std::string source =
-      options.file == "-" ? name : std::filesystem::path(options.file).filename().string();
-  const std::string page = FillPage(chartPage, DataOf(series, source));
-  if (options.out == "-")
-    Print(page);
-  else
-    WriteFile(options.out, page);
+  WriteFile(options.out, FillPage(chartPage, DataOf(series, ShortNameOfFile(options.file))));
 }
 
 } // namespace

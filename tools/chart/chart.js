@@ -3,7 +3,6 @@
 // bytes held or null, payload]; the pool is there from its first point to its last.
 "use strict";
 
-const data = JSON.parse(document.getElementById("data").textContent);
 const pools = data.pools;
 const lastPlace = data.lines.length - 1;
 const hasHeld = pools.some((pool) => pool.points[0][1] !== null); // a trace has no buckets
@@ -14,9 +13,6 @@ const height = 360;
 
 let place = lastPlace; // of the cursor
 let picked = null;
-
-const formatNumber = (value) => value.toLocaleString("en");
-const counted = (count, word) => `${formatNumber(count)} ${word}${count === 1 ? "" : "s"}`;
 
 function formatBytes(bytes) {
   const units = ["bytes", "KiB", "MiB", "GiB", "TiB"];
@@ -31,17 +27,6 @@ function formatBytes(bytes) {
 function formatBoth(bytes) {
   if (bytes === null) return "-";
   return bytes < 1024 ? formatBytes(bytes) : `${formatBytes(bytes)} (${formatNumber(bytes)})`;
-}
-
-function make(name, attributes = {}, ...children) {
-  const isShape = ["svg", "g", "path", "line", "text", "circle", "rect"].includes(name);
-  const element = isShape ? document.createElementNS("http://www.w3.org/2000/svg", name)
-    : document.createElement(name);
-  for (const [key, value] of Object.entries(attributes))
-    if (typeof value === "function") element.addEventListener(key, value);
-    else element.setAttribute(key, value);
-  element.append(...children);
-  return element;
 }
 
 /** Null where the pool isn't there. */

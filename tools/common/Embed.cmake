@@ -7,15 +7,15 @@ file(READ ${PAGE} page)
 function(embed pattern before after)
   string(REGEX MATCHALL "${pattern}" elements "${page}")
   foreach(element IN LISTS elements)
-    string(REGEX MATCH "[a-z]+\\.(css|js)" name "${element}")
+    string(REGEX MATCH "[a-z./]+\\.(css|js)" name "${element}")
     file(READ ${folder}/${name} text)
     string(REPLACE "${element}" "${before}\n${text}${after}" page "${page}")
   endforeach()
   set(page "${page}" PARENT_SCOPE)
 endfunction()
 
-embed("<link rel=\"stylesheet\" href=\"[a-z]+\\.css\">" "<style>" "</style>")
-embed("<script src=\"[a-z]+\\.js\"></script>" "<script>" "</script>")
+embed("<link rel=\"stylesheet\" href=\"[a-z./]+\\.css\">" "<style>" "</style>")
+embed("<script src=\"[a-z./]+\\.js\"></script>" "<script>" "</script>")
 
 # What stands there lets the page's files be opened as they are.
 if(NOT page MATCHES "(<script type=\"application/json\" id=\"data\">)([^<]*)<")

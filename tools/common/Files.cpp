@@ -8,6 +8,11 @@
 #include <filesystem>
 #include <fmt/format.h>
 #include <system_error>
+#if defined(_WIN32)
+#include <io.h>
+#else
+#include <unistd.h>
+#endif
 
 namespace VOK::MemPool::Tools {
 
@@ -17,9 +22,21 @@ namespace {
   throw Failure(fmt::format("{}: {}: {}", name, what, std::strerror(errno)));
 }
 
+bool IsTerminal() {
+#if defined(_WIN32)
+  return _isatty(_fileno(stderr)) != 0;
+#else
+  return isatty(fileno(stderr)) != 0;
+#endif
+}
+
 } // namespace
 
 std::string NameOfFile(const std::string& path) { return path == "-" ? "standard input" : path; }
+
+std::string ShortNameOfFile(const std::string& path) {
+  return path == "-" ? NameOfFile(path) : std::filesystem::path(path).filename().string();
+}
 
 void Input::Closer::operator()(std::FILE* open) const {
   if (open != stdin) std::fclose(open);
@@ -55,12 +72,39 @@ std::string Input::ReadAll() {
   return text;
 }
 
+Progress::Progress(std::uint64_t total_) : total(total_), isTerminal(IsTerminal()) {}
+
+Progress::~Progress() {
+  if (isShown) std::fputs("\r\x1b[K", stderr);
+}
+
+void Progress::Add(std::uint64_t bytes) {
+  done += bytes;
+  if (!isTerminal || Clock::now() < due) return;
+  due = Clock::now() + std::chrono::milliseconds(200);
+  isShown = true;
+  Show();
+}
+
+void Progress::Show() const {
+  constexpr std::uint64_t width = 40;
+  constexpr std::uint64_t mega = 1000000;
+  if (total == 0) {
+    fmt::print(stderr, "\r{} MB read\x1b[K", done / mega);
+    return;
+  }
+  const auto part = static_cast<std::size_t>(std::min(done, total) * width / total);
+  fmt::print(stderr, "\r[{:<{}}] {} of {} MB\x1b[K", std::string(part, '#'), width, done / mega,
+             total / mega);
+}
+
 void Print(std::string_view text) {
   if (std::fwrite(text.data(), 1, text.size(), stdout) != text.size())
     Fail("standard output", "can't be written");
 }
 
 void WriteFile(const std::string& path, std::string_view text) {
+  if (path == "-") return Print(text);
   std::FILE* const file = std::fopen(path.c_str(), "wb");
   if (file == nullptr) Fail(path, "can't be opened");
   const bool isWritten = std::fwrite(text.data(), 1, text.size(), file) == text.size();

@@ -1,7 +1,8 @@
-// The file that a command reads, and the stream or file that it writes.
+// The file that a command reads, with its progress, and the stream or file that it writes.
 #ifndef VOK_MEMPOOL_TOOLS_COMMON_FILES_H
 #define VOK_MEMPOOL_TOOLS_COMMON_FILES_H
 
+#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <cstdio>
@@ -13,6 +14,9 @@ namespace VOK::MemPool::Tools {
 
 /// What messages call a file: "-" is standard input.
 std::string NameOfFile(const std::string& path);
+
+/// What pages call it: without its folder.
+std::string ShortNameOfFile(const std::string& path);
 
 /// A file to read, or standard input under the name "-".
 class Input {
@@ -38,10 +42,34 @@ private:
   std::uint64_t size = 0;
 };
 
+/// A bar for long work. It appears on the error stream after two seconds, if that is a terminal,
+/// and is removed with the object.
+class Progress {
+public:
+  /// `total` bytes are to be read; 0 if unknown.
+  explicit Progress(std::uint64_t total);
+  ~Progress();
+  Progress(const Progress&) = delete;
+  Progress& operator=(const Progress&) = delete;
+
+  void Add(std::uint64_t bytes);
+
+private:
+  using Clock = std::chrono::steady_clock;
+
+  void Show() const;
+
+  const std::uint64_t total;
+  const bool isTerminal;
+  std::uint64_t done = 0;
+  Clock::time_point due = Clock::now() + std::chrono::seconds(2);
+  bool isShown = false;
+};
+
 /// Writes on standard output. Fails if that can't be done.
 void Print(std::string_view text);
 
-/// Writes a whole file. Fails if that can't be done.
+/// Writes a whole file, or on standard output under the name "-". Fails if that can't be done.
 void WriteFile(const std::string& path, std::string_view text);
 
 /// A text on one line: characters that aren't printable are shown by their code.

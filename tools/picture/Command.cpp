@@ -6,7 +6,6 @@
 #include "report/Formats.h"
 
 #include <CLI/CLI.hpp>
-#include <filesystem>
 #include <fmt/format.h>
 #include <memory>
 
@@ -26,7 +25,7 @@ bool IsPlain(const Report& report) {
 /// stream, or are a failure if there is no other.
 PictureSource Read(const std::string& file) {
   const std::string name = NameOfFile(file);
-  PictureSource source{file == "-" ? name : std::filesystem::path(file).filename().string(), {}};
+  PictureSource source{ShortNameOfFile(file), {}};
   std::string plain;
   ReportText text = ReadReports(Input(file).ReadAll());
   if (!text.cut.empty() || text.reports.empty())
@@ -47,13 +46,9 @@ PictureSource Read(const std::string& file) {
 
 void Run(const Options& options) {
   const PictureSource report = Read(options.report);
-  const std::string page =
-      FillPage(picturePage, options.other.empty() ? PictureData(nullptr, report)
-                                                  : PictureData(&report, Read(options.other)));
-  if (options.out == "-")
-    Print(page);
-  else
-    WriteFile(options.out, page);
+  WriteFile(options.out, FillPage(picturePage, options.other.empty()
+                                                   ? PictureData(nullptr, report)
+                                                   : PictureData(&report, Read(options.other))));
 }
 
 } // namespace

@@ -5,7 +5,6 @@
 const Type = Object.freeze({ free: 0, used: 1, ext: 2, unknown: 3 });
 const typeNames = ["FREE", "USED", "EXT", "UNKN"];
 
-const data = JSON.parse(document.getElementById("data").textContent);
 const isPair = data.files.length === 2;
 
 const digits = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";

@@ -1,21 +1,7 @@
 // Elements, numbers, bars, and tables that sort.
 "use strict";
 
-/** An element with attributes (a function is a listener) and children. */
-function make(name, attributes = {}, ...children) {
-  const element = document.createElement(name);
-  for (const [key, value] of Object.entries(attributes)) {
-    if (typeof value === "function") element.addEventListener(key, value);
-    else if (value !== null && value !== false) element.setAttribute(key, value === true ? "" : value);
-  }
-  element.append(...children.filter((child) => child !== null));
-  return element;
-}
-
-const numberFormat = new Intl.NumberFormat("en");
-const formatNumber = (number) => numberFormat.format(number);
 const formatPercent = (percent) => `${percent.toFixed(1)} %`;
-const counted = (number, one, many = `${one}s`) => `${formatNumber(number)} ${number === 1 ? one : many}`;
 
 /** The largest of what a key gives for some items, and at least 1. */
 const largest = (items, keyOf) => items.reduce((most, item) => Math.max(most, keyOf(item)), 1);

@@ -3,7 +3,6 @@
 #include "common/Files.h"
 #include "common/Tool.h"
 #include "report/Check.h"
-#include "report/Difference.h"
 #include "report/Formats.h"
 #include "report/Summary.h"
 

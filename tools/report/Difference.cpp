@@ -1,7 +1,6 @@
-#include "report/Difference.h"
+#include "report/Summary.h"
 
 #include "common/Files.h"
-#include "report/Summary.h"
 
 #include <algorithm>
 #include <fmt/format.h>

@@ -12,6 +12,11 @@ namespace {
 
 using Json = nlohmann::ordered_json;
 
+/// Bytes that aren't UTF-8 are replaced.
+std::string TextOf(const Json& json) {
+  return json.dump(-1, ' ', false, Json::error_handler_t::replace);
+}
+
 bool IsUtf8(const std::string& text) {
   try {
     return !Json(text).dump().empty();
@@ -40,13 +45,8 @@ public:
   explicit Putter(Json& object_) : object(object_) {}
 
   void Text(const std::string& key, const std::string& text) {
-    if (IsUtf8(text)) {
-      object[key] = text;
-      return;
-    }
-    object[key] =
-        Json::parse(Json(text).dump(-1, ' ', false, nlohmann::detail::error_handler_t::replace));
-    object[key + textBytes] = HexOf(text);
+    object[key] = text;
+    if (!IsUtf8(text)) object[key + textBytes] = HexOf(text);
   }
 
   void Line(const char*, const char* key, const std::string& text) { Text(key, text); }
@@ -140,12 +140,12 @@ void WriteJson(const std::vector<Report>& reports,
   write("{\"reports\":[");
   std::string separator = "\n";
   for (const Report& report : reports) {
-    std::string head = HeadOf(report).dump();
+    std::string head = TextOf(HeadOf(report));
     head.back() = ','; // for its last member, which goes out bucket by bucket
     write(std::exchange(separator, ",\n") + head + "\"bucketReports\":[");
     std::string bucketSeparator = "\n";
     for (const BucketReport& bucket : report.bucketReports)
-      write(std::exchange(bucketSeparator, ",\n") + ToJson(bucket).dump());
+      write(std::exchange(bucketSeparator, ",\n") + TextOf(ToJson(bucket)));
     write("]}");
   }
   write("]}\n");

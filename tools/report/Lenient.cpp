@@ -3,7 +3,6 @@
 #include "report/Form.h"
 #include "report/Formats.h"
 #include "report/Lines.h"
-#include "report/Reader.h"
 
 #include <algorithm>
 #include <cctype>

@@ -7,6 +7,7 @@
 #include "report/Model.h"
 
 #include <cstddef>
+#include <optional>
 #include <string>
 #include <string_view>
 
@@ -97,6 +98,10 @@ private:
   const std::string_view line;
   std::size_t at = 0;
 };
+
+/// Takes the next report, nothing if there is none; `title` becomes the line of its title. Throws
+/// LineFailure, and then the lines are inside the report.
+std::optional<Report> TakeReport(Lines& lines, std::size_t& title);
 
 } // namespace VOK::MemPool::Tools
 

@@ -1,8 +1,7 @@
-#include "report/Reader.h"
+#include "report/Lines.h"
 
 #include "report/Form.h"
 #include "report/Formats.h"
-#include "report/Lines.h"
 
 #include <algorithm>
 #include <fmt/format.h>

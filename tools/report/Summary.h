@@ -1,5 +1,5 @@
-// The pools of a text side by side: what each holds, and what of that its callers use; for people,
-// for Prometheus and for a spreadsheet.
+// The pools of a text side by side: what each holds, what of that its callers use, and what has
+// changed since an earlier text; for people, for Prometheus and for a spreadsheet.
 // Test: tests/tools/tools_test.py.
 #ifndef VOK_MEMPOOL_TOOLS_REPORT_SUMMARY_H
 #define VOK_MEMPOOL_TOOLS_REPORT_SUMMARY_H
@@ -33,6 +33,12 @@ std::string SeriesText(const std::vector<Report>& reports);
 
 /// The same as a JSON array of objects.
 std::string SeriesJson(const std::vector<Report>& reports);
+
+/// A line for each pool that differs, by name, and below it one for each of its record sizes. Of
+/// several reports of a name the last counts. `showsRecords` adds each record that came into use or
+/// went out of it, by address, as far as the reports have them. Empty if nothing differs.
+std::string Difference(const std::vector<Report>& before, const std::vector<Report>& now,
+                       bool showsRecords);
 
 } // namespace VOK::MemPool::Tools
 

@@ -5,7 +5,6 @@
 #define VOK_MEMPOOL_TOOLS_TRACE_READER_H
 
 #include "common/Files.h"
-#include "common/Progress.h"
 
 #include <cstdint>
 #include <cstring>
