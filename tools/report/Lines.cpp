@@ -170,8 +170,8 @@ Number Fields::TakeLeftNumber(int width) {
     at = start;
     Fail(expected);
   }
-  while (at < start + static_cast<std::size_t>(width))
-    TakeText(" ");
+  const std::size_t end = std::max(at, start + static_cast<std::size_t>(width));
+  TakeText(std::string(end - at, ' '));
   return *number;
 }
 
