@@ -57,10 +57,13 @@ int Run(int argc, char** argv) {
   Tools::AddChart(app);
   Tools::AddInspect(app);
   Tools::AddTop(app);
+  Tools::AddRecord(app);
   try {
     app.parse(argc, argv);
   } catch (const CLI::Success& help) {
     return app.exit(help);
+  } catch (const Tools::ExitStatus& exit) {
+    return exit.status;
   } catch (const CLI::ParseError& error) {
     fmt::print(stderr, "vokmempool: {}\nusage: vokmempool SUBCOMMAND [OPTIONS] [FILE]\n",
                Explain(app, argv[1], error));

@@ -16,6 +16,11 @@ public:
   using std::runtime_error::runtime_error;
 };
 
+/// What ends a command with a status that isn't its own.
+struct ExitStatus {
+  int status;
+};
+
 // Each of these functions declares the arguments of a subcommand, and what runs once they are read.
 
 void AddReport(CLI::App& app);
@@ -24,6 +29,7 @@ void AddTrace(CLI::App& app);
 void AddChart(CLI::App& app);
 void AddInspect(CLI::App& app);
 void AddTop(CLI::App& app);
+void AddRecord(CLI::App& app);
 
 } // namespace VOK::MemPool::Tools
 

@@ -19,5 +19,6 @@ void AddAbsent(CLI::App& app, const char* name) {
 
 void AddInspect(CLI::App& app) { AddAbsent(app, "inspect"); }
 void AddTop(CLI::App& app) { AddAbsent(app, "top"); }
+void AddRecord(CLI::App& app) { AddAbsent(app, "record"); }
 
 } // namespace VOK::MemPool::Tools

@@ -4,7 +4,7 @@
 #ifndef VOK_MEMPOOL_TOOLS_TRACE_LEDGER_H
 #define VOK_MEMPOOL_TOOLS_TRACE_LEDGER_H
 
-#include "trace/LiveTable.h"
+#include "common/AddressTable.h"
 #include "trace/Reader.h"
 
 #include <array>
@@ -78,6 +78,16 @@ struct MixedLine {
   std::string text; ///< its beginning
 };
 
+struct LiveRecord {
+  std::uint64_t data = 0;  ///< what the caller holds
+  std::uint64_t line = 0;  ///< of its request; 0 in an empty place of the table
+  std::uint64_t event = 0; ///< its number among the trace lines
+  std::uint32_t size = 0;  ///< as asked for
+  std::uint32_t pool = 0;  ///< the key of its pool
+
+  bool IsUsed() const { return line != 0; }
+};
+
 class TraceLedger {
 public:
   struct Live {
@@ -144,7 +154,7 @@ private:
   void MarkPeak(TracedPool& pool) const;
   void DropStale();
 
-  LiveTable live;                                        ///< also those of ended pools, for a while
+  AddressTable<LiveRecord> live;                         ///< also those of ended pools, for a while
   std::uint64_t numStale = 0;                            ///< entries of ended pools
   std::unordered_map<std::uint64_t, LivePool> livePools; ///< by address
   std::unordered_map<std::uint32_t, std::uint64_t> addrByKey;   ///< of live pools

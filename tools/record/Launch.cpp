@@ -1,0 +1,156 @@
+#include "record/Launch.h"
+
+#include "common/Files.h"
+#include "common/Tool.h"
+#include "record/Ring.h"
+
+#include <array>
+#include <cerrno>
+#include <csignal>
+#include <cstdlib>
+#include <cstring>
+#include <elf.h>
+#include <filesystem>
+#include <fmt/format.h>
+#include <fstream>
+#include <spawn.h>
+#include <string_view>
+#include <sys/stat.h>
+#include <sys/xattr.h>
+#include <unistd.h>
+
+extern char** environ;
+
+namespace VOK::MemPool::Tools {
+
+namespace {
+
+namespace fs = std::filesystem;
+
+std::string SearchPath(const std::string& command) {
+  if (command.find('/') != command.npos) return command;
+  const char* const variable = std::getenv("PATH");
+  std::string_view rest = variable != nullptr ? variable : "/usr/bin:/bin";
+  while (!rest.empty()) {
+    const std::size_t end = std::min(rest.find(':'), rest.size());
+    const fs::path path = fs::path(end == 0 ? "." : rest.substr(0, end)) / command;
+    if (access(path.c_str(), X_OK) == 0 && !fs::is_directory(path)) return path;
+    rest.remove_prefix(std::min(end + 1, rest.size()));
+  }
+  throw Failure(fmt::format("{}: no such program", OneLine(command)));
+}
+
+bool HasInterpreter(std::ifstream& file, const Elf64_Ehdr& header) {
+  for (unsigned i = 0; i < header.e_phnum; ++i) {
+    Elf64_Phdr segment{};
+    file.seekg(static_cast<std::streamoff>(header.e_phoff + i * header.e_phentsize));
+    if (!file.read(reinterpret_cast<char*>(&segment), sizeof segment)) return false;
+    if (segment.p_type == PT_INTERP) return true;
+  }
+  return false;
+}
+
+/// The program that runs a script, empty if the file isn't one.
+std::string InterpreterOf(const std::string& path) {
+  std::ifstream file(path, std::ios::binary);
+  std::string line;
+  if (!std::getline(file, line) || !line.starts_with("#!")) return {};
+  const std::size_t begin = std::min(line.find_first_not_of(" \t", 2), line.size());
+  return line.substr(begin, line.find_first_of(" \t", begin) - begin);
+}
+
+/// Fails if the loader wouldn't preload a library into the program.
+void CheckPreload(const std::string& path) {
+  struct stat state {};
+  if (stat(path.c_str(), &state) != 0 || access(path.c_str(), X_OK) != 0)
+    throw Failure(fmt::format("{}: can't be run: {}", path, std::strerror(errno)));
+  if (const std::string interpreter = InterpreterOf(path); !interpreter.empty())
+    return CheckPreload(interpreter);
+  if ((state.st_mode & (S_ISUID | S_ISGID)) != 0 ||
+      getxattr(path.c_str(), "security.capability", nullptr, 0) > 0)
+    throw Failure(
+        fmt::format("{}: runs with other rights than the caller's, so that no library can "
+                    "be preloaded",
+                    path));
+  std::ifstream file(path, std::ios::binary);
+  Elf64_Ehdr header{};
+  if (!file.read(reinterpret_cast<char*>(&header), sizeof header) ||
+      std::memcmp(header.e_ident, ELFMAG, SELFMAG) != 0)
+    throw Failure(fmt::format("{}: isn't a program", path));
+  if (header.e_ident[EI_CLASS] != ELFCLASS64)
+    throw Failure(fmt::format("{}: is a 32-bit program; only 64-bit ones can be recorded", path));
+  if (!HasInterpreter(file, header))
+    throw Failure(
+        fmt::format("{}: is linked statically, so that no library can be preloaded", path));
+}
+
+/// Beside this program: installed in the library's folder, else where the build made it.
+std::string FindLibrary() {
+  constexpr const char* name = "libvokmempool-record.so";
+  const fs::path folder = fs::read_symlink("/proc/self/exe").parent_path();
+  for (const fs::path& path : {folder / VOK_MEMPOOL_RECORD_FOLDER / name, folder / name})
+    if (fs::exists(path)) return fs::canonical(path);
+  throw Failure(fmt::format("{} is missing beside this program", name));
+}
+
+std::vector<char*> Pointers(std::vector<std::string>& texts) {
+  std::vector<char*> pointers;
+  for (std::string& text : texts)
+    pointers.push_back(text.data());
+  pointers.push_back(nullptr);
+  return pointers;
+}
+
+volatile sig_atomic_t launched = 0;
+
+void PassOn(int signal) { kill(launched, signal); }
+
+} // namespace
+
+RingFolder::RingFolder() {
+  const bool hasMemory = access("/dev/shm", W_OK) == 0;
+  path = (hasMemory ? fs::path("/dev/shm") : fs::temp_directory_path()) / "vokmempool.XXXXXX";
+  if (mkdtemp(path.data()) == nullptr)
+    throw Failure(fmt::format("{}: can't be made: {}", path, std::strerror(errno)));
+}
+
+RingFolder::~RingFolder() {
+  std::error_code ignored;
+  fs::remove_all(path, ignored);
+}
+
+std::string FindProgram(const std::string& command) {
+  const std::string path = SearchPath(command);
+  CheckPreload(path);
+  return path;
+}
+
+pid_t Launch(const std::string& program, std::vector<std::string> arguments,
+             const std::string& rings, unsigned depth) {
+  std::vector<std::string> variables;
+  std::string preload = fmt::format("LD_PRELOAD={}", FindLibrary());
+  for (char** variable = environ; *variable != nullptr; ++variable) {
+    const std::string_view text = *variable;
+    constexpr std::string_view own = "LD_PRELOAD=";
+    if (text.starts_with(own))
+      preload += fmt::format(":{}", text.substr(own.size()));
+    else
+      variables.emplace_back(text);
+  }
+  variables.push_back(preload);
+  variables.push_back(fmt::format("{}={}", Record::folderVariable, rings));
+  variables.push_back(fmt::format("{}={} {}", Record::settingVariable, depth, getpid()));
+
+  pid_t child = 0;
+  const int error = posix_spawn(&child, program.c_str(), nullptr, nullptr,
+                                Pointers(arguments).data(), Pointers(variables).data());
+  if (error != 0) throw Failure(fmt::format("{}: can't be run: {}", program, std::strerror(error)));
+  launched = child;
+  std::signal(SIGINT, SIG_IGN);
+  std::signal(SIGQUIT, SIG_IGN);
+  std::signal(SIGTERM, PassOn);
+  std::signal(SIGHUP, PassOn);
+  return child;
+}
+
+} // namespace VOK::MemPool::Tools
