@@ -58,6 +58,7 @@ int Run(int argc, char** argv) {
   Tools::AddInspect(app);
   Tools::AddTop(app);
   Tools::AddRecord(app);
+  Tools::AddAdvise(app);
   try {
     app.parse(argc, argv);
   } catch (const CLI::Success& help) {

@@ -143,7 +143,7 @@ def test_commands():
     same_as_golden("trace-json", tool(*NAMED, "--json", given=TRACE))
     slow = f"(sleep 2.1; echo zvpt:c:a0) | {PROGRAM} trace"
     terminal = run("script", "-qec", slow, "/dev/null")[0]
-    same(is_like(terminal, "\r0 MB read\x1b[K\r\x1b[K1 lines*"), True, repr(terminal))
+    same(is_like(terminal, "\r0 MB done\x1b[K\r\x1b[K1 lines*"), True, repr(terminal))
 
 
 def test_completion():

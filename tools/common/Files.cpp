@@ -72,14 +72,15 @@ std::string Input::ReadAll() {
   return text;
 }
 
-Progress::Progress(std::uint64_t total_) : total(total_), isTerminal(IsTerminal()) {}
+Progress::Progress(std::uint64_t total_, const char* unit_, std::uint64_t scale_)
+    : total(total_), unit(unit_), scale(scale_), isTerminal(IsTerminal()) {}
 
 Progress::~Progress() {
   if (isShown) std::fputs("\r\x1b[K", stderr);
 }
 
-void Progress::Add(std::uint64_t bytes) {
-  done += bytes;
+void Progress::Add(std::uint64_t units) {
+  done += units;
   if (!isTerminal || Clock::now() < due) return;
   due = Clock::now() + std::chrono::milliseconds(200);
   isShown = true;
@@ -88,14 +89,13 @@ void Progress::Add(std::uint64_t bytes) {
 
 void Progress::Show() const {
   constexpr std::uint64_t width = 40;
-  constexpr std::uint64_t mega = 1000000;
   if (total == 0) {
-    fmt::print(stderr, "\r{} MB read\x1b[K", done / mega);
+    fmt::print(stderr, "\r{} {} done\x1b[K", done / scale, unit);
     return;
   }
   const auto part = static_cast<std::size_t>(std::min(done, total) * width / total);
-  fmt::print(stderr, "\r[{:<{}}] {} of {} MB\x1b[K", std::string(part, '#'), width, done / mega,
-             total / mega);
+  fmt::print(stderr, "\r[{:<{}}] {} of {} {}\x1b[K", std::string(part, '#'), width, done / scale,
+             total / scale, unit);
 }
 
 void Print(std::string_view text) {

@@ -46,13 +46,13 @@ private:
 /// and is removed with the object.
 class Progress {
 public:
-  /// `total` bytes are to be read; 0 if unknown.
-  explicit Progress(std::uint64_t total);
+  /// `total` units of the work are to be done, 0 if unknown; each shown one is `scale` of them.
+  explicit Progress(std::uint64_t total, const char* unit = "MB", std::uint64_t scale = 1000000);
   ~Progress();
   Progress(const Progress&) = delete;
   Progress& operator=(const Progress&) = delete;
 
-  void Add(std::uint64_t bytes);
+  void Add(std::uint64_t units);
 
 private:
   using Clock = std::chrono::steady_clock;
@@ -60,6 +60,8 @@ private:
   void Show() const;
 
   const std::uint64_t total;
+  const char* const unit;
+  const std::uint64_t scale;
   const bool isTerminal;
   std::uint64_t done = 0;
   Clock::time_point due = Clock::now() + std::chrono::seconds(2);

@@ -30,6 +30,7 @@ void AddChart(CLI::App& app);
 void AddInspect(CLI::App& app);
 void AddTop(CLI::App& app);
 void AddRecord(CLI::App& app);
+void AddAdvise(CLI::App& app);
 
 } // namespace VOK::MemPool::Tools
 

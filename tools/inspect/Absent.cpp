@@ -20,5 +20,6 @@ void AddAbsent(CLI::App& app, const char* name) {
 void AddInspect(CLI::App& app) { AddAbsent(app, "inspect"); }
 void AddTop(CLI::App& app) { AddAbsent(app, "top"); }
 void AddRecord(CLI::App& app) { AddAbsent(app, "record"); }
+void AddAdvise(CLI::App& app) { AddAbsent(app, "advise"); }
 
 } // namespace VOK::MemPool::Tools

@@ -1,6 +1,7 @@
 #include "record/Launch.h"
 
 #include "common/Files.h"
+#include "common/Programs.h"
 #include "common/Tool.h"
 #include "record/Ring.h"
 
@@ -18,8 +19,6 @@
 #include <sys/stat.h>
 #include <sys/xattr.h>
 #include <unistd.h>
-
-extern char** environ;
 
 namespace VOK::MemPool::Tools {
 
@@ -84,23 +83,6 @@ void CheckPreload(const std::string& path) {
         fmt::format("{}: is linked statically, so that no library can be preloaded", path));
 }
 
-/// Beside this program: installed in the library's folder, else where the build made it.
-std::string FindLibrary() {
-  constexpr const char* name = "libvokmempool-record.so";
-  const fs::path folder = fs::read_symlink("/proc/self/exe").parent_path();
-  for (const fs::path& path : {folder / VOK_MEMPOOL_RECORD_FOLDER / name, folder / name})
-    if (fs::exists(path)) return fs::canonical(path);
-  throw Failure(fmt::format("{} is missing beside this program", name));
-}
-
-std::vector<char*> Pointers(std::vector<std::string>& texts) {
-  std::vector<char*> pointers;
-  for (std::string& text : texts)
-    pointers.push_back(text.data());
-  pointers.push_back(nullptr);
-  return pointers;
-}
-
 volatile sig_atomic_t launched = 0;
 
 void PassOn(int signal) { kill(launched, signal); }
@@ -108,8 +90,7 @@ void PassOn(int signal) { kill(launched, signal); }
 } // namespace
 
 RingFolder::RingFolder() {
-  const bool hasMemory = access("/dev/shm", W_OK) == 0;
-  path = (hasMemory ? fs::path("/dev/shm") : fs::temp_directory_path()) / "vokmempool.XXXXXX";
+  path = TemporaryName();
   if (mkdtemp(path.data()) == nullptr)
     throw Failure(fmt::format("{}: can't be made: {}", path, std::strerror(errno)));
 }
@@ -127,17 +108,10 @@ std::string FindProgram(const std::string& command) {
 
 pid_t Launch(const std::string& program, std::vector<std::string> arguments,
              const std::string& rings, unsigned depth) {
-  std::vector<std::string> variables;
-  std::string preload = fmt::format("LD_PRELOAD={}", FindLibrary());
-  for (char** variable = environ; *variable != nullptr; ++variable) {
-    const std::string_view text = *variable;
-    constexpr std::string_view own = "LD_PRELOAD=";
-    if (text.starts_with(own))
-      preload += fmt::format(":{}", text.substr(own.size()));
-    else
-      variables.emplace_back(text);
-  }
-  variables.push_back(preload);
+  std::vector<std::string> variables = Environment();
+  const char* const before = std::getenv("LD_PRELOAD");
+  variables.push_back(fmt::format("LD_PRELOAD={}{}{}", FindHelper("libvokmempool-record.so"),
+                                  before != nullptr ? ":" : "", before != nullptr ? before : ""));
   variables.push_back(fmt::format("{}={}", Record::folderVariable, rings));
   variables.push_back(fmt::format("{}={} {}", Record::settingVariable, depth, getpid()));
 

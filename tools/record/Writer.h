@@ -31,8 +31,8 @@ public:
 
 private:
   struct Closer {
-    void operator()(std::FILE* file) const { std::fclose(file); }
-    void operator()(ZSTD_CCtx* context) const { ZSTD_freeCCtx(context); }
+    void operator()(std::FILE* open) const { std::fclose(open); }
+    void operator()(ZSTD_CCtx* made) const { ZSTD_freeCCtx(made); }
   };
 
   void WriteBlock();

@@ -1,0 +1,75 @@
+// What `vokmempool advise` answers: the statistics of a recording, and what replays with pools
+// took. Test: tests/tools/record_test.py.
+#ifndef VOK_MEMPOOL_TOOLS_ADVISE_ADVICE_H
+#define VOK_MEMPOOL_TOOLS_ADVISE_ADVICE_H
+
+#include "advise/Measure.h"
+#include "advise/Plan.h"
+#include "advise/Statistics.h"
+
+#include <cstdint>
+#include <memory>
+#include <nlohmann/json.hpp>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace VOK::MemPool::Tools {
+
+struct AdviceRequest {
+  std::string file;
+  unsigned rounds = 10;
+  std::uint64_t mostEvents = 4000000; ///< that are replayed
+  bool measures = true;               ///< else statistics alone
+};
+
+/// A call site with the most requests.
+struct SiteAdvice {
+  std::uint32_t site;
+  Verdict verdict;
+  std::string change;              ///< how it would move to a pool
+  std::optional<Interval> seconds; ///< more than the heap, with this site alone in a pool
+  bool isChosen = false;           ///< in the best grouping
+};
+
+/// A variant beside the heap's time in the same rounds.
+struct Outcome {
+  Variant variant;
+  Interval difference; ///< seconds more than the heap
+};
+
+class Advice {
+public:
+  /// Fails if the file is no recording, or if a replay fails.
+  explicit Advice(const AdviceRequest& request);
+
+  std::string GetText() const;
+  nlohmann::ordered_json GetJson() const;
+
+  /// The answer in one sentence.
+  std::string GetAnswer() const;
+
+  const AdviceRequest request;
+  Recording recording;
+  Statistics statistics;
+  std::vector<SiteAdvice> sites; ///< by requests, the most first
+
+  // Of the replays. Without candidates there are none.
+  std::uint64_t firstEvent = 0, lastEvent = 0;
+  bool isWhole = true;
+  Variant heap;                  ///< of the last rounds
+  std::vector<Outcome> outcomes; ///< of the grouping: settings, Reset, other allocators
+  std::optional<Outcome> best;   ///< measured again, in rounds of its own
+  bool Pays() const { return best && best->difference.high < 0; }
+
+private:
+  void JudgeSites();
+  void Replay();
+  std::uint64_t ChooseGrouping(const std::string& operations);
+  std::vector<Variant> VariantsOf(std::uint64_t pooled) const;
+  const Outcome* FindBest() const;
+};
+
+} // namespace VOK::MemPool::Tools
+
+#endif

@@ -1,0 +1,215 @@
+// vokmempool-replay: replays operations once, in a process of its own, and prints what that took.
+// It is started by `vokmempool advise` and `vokmempool replay`, with the allocator under test
+// preloaded. Test: tests/tools/record_test.py.
+#include "advise/Operations.h"
+
+#include <MemPoolAllocator>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <ctime>
+#include <fcntl.h>
+#include <memory>
+#include <span>
+#include <string>
+#include <sys/mman.h>
+#include <sys/stat.h>
+#include <unistd.h>
+#include <vector>
+
+namespace {
+
+using namespace VOK::MemPool;
+using namespace VOK::MemPool::Tools;
+
+[[noreturn]] void Fail(const char* what) {
+  std::fprintf(stderr, "vokmempool-replay: %s\n", what);
+  std::exit(1);
+}
+
+struct Block {
+  void* data = nullptr;
+  std::uint32_t size = 0;
+};
+
+struct Figures {
+  std::uint64_t nanoseconds = 0;
+  std::uint64_t bytes = 0;     ///< resident in the heap at the peak
+  std::uint64_t bytesHeld = 0; ///< by the pools, at their own peak
+};
+
+/// A program writes what it allocates: each line of a small block, each page of a large one.
+void Touch(const Block& block) {
+  constexpr std::uint32_t line = 64, page = 4096;
+  auto* const bytes = static_cast<volatile char*>(block.data);
+  for (std::uint32_t i = 0; i < block.size; i += i < page ? line : page)
+    bytes[i] = 1;
+}
+
+/// Bytes of memory that belong to no file.
+std::uint64_t ResidentBytes() {
+  char text[4096];
+  const int file = open("/proc/self/status", O_RDONLY | O_CLOEXEC);
+  const ssize_t length = read(file, text, sizeof text - 1);
+  close(file);
+  text[length > 0 ? length : 0] = 0;
+  const char* const line = std::strstr(text, "RssAnon:");
+  return line != nullptr ? std::strtoull(line + sizeof "RssAnon:", nullptr, 10) * 1024 : 0;
+}
+
+std::uint64_t GetTime() {
+  timespec now{};
+  clock_gettime(CLOCK_PROCESS_CPUTIME_ID, &now);
+  return static_cast<std::uint64_t>(now.tv_sec) * 1'000'000'000 +
+         static_cast<std::uint64_t>(now.tv_nsec);
+}
+
+/// A pool as the adaptors use it.
+struct Group {
+  Group(const std::string& name, const Options& options) : pool(name, options), resource(pool) {}
+  Mgr pool;
+  Resource resource;
+};
+
+/// What an object of that size needs, as far as one can know.
+std::size_t AlignmentOf(std::uint32_t size) {
+  constexpr std::uint32_t most = 8;
+  return size % most == 0 ? most : size & (0 - size);
+}
+
+class Replay {
+public:
+  /// Only the groups in the bits of `pooled` have pools.
+  Replay(const OperationsHeader& header_, std::span<const Operation> operations_,
+         const Options& options, std::uint64_t pooled, bool resets_)
+      : header(header_), operations(operations_), blocks(header.slots), groups(header.groups),
+        resets(resets_) {
+    for (std::uint32_t group = 1; group < header.groups; ++group)
+      if ((pooled >> group & 1) != 0)
+        groups[group] = std::make_unique<Group>("group " + std::to_string(group), options);
+  }
+
+  Figures Run() {
+    Figures figures;
+    const std::uint64_t before = ResidentBytes();
+    RunTo(header.first);
+    std::uint64_t start = GetTime();
+    RunTo(header.peak + 1);
+    figures.nanoseconds = GetTime() - start;
+    figures.bytes = ResidentBytes() - before;
+    start = GetTime();
+    RunTo(header.count);
+    figures.nanoseconds += GetTime() - start;
+    for (const auto& group : groups)
+      if (group) figures.bytesHeld += group->pool.GetStats().peakBytesHeld;
+    return figures;
+  }
+
+private:
+  void RunTo(std::uint64_t end) {
+    for (; at < end; ++at)
+      Do(operations[at]);
+  }
+
+  void Do(const Operation& operation) {
+    Group* const group = groups[operation.group].get();
+    Block& block = blocks[operation.slot];
+    switch (operation.action) {
+    case Action::Alloc:
+    case Action::AllocZero:
+      block = {group != nullptr ? Alloc(*group, operation) : AllocFromHeap(operation),
+               operation.size};
+      if (block.data == nullptr) Fail("out of memory");
+      return Touch(block);
+    case Action::FreeWithAll:
+      if (resets && group != nullptr) return;
+      [[fallthrough]];
+    case Action::Free:
+      return Free(group, block);
+    case Action::Resize:
+      return Resize(group, block, operation.size);
+    case Action::Reset:
+      if (resets && group != nullptr) group->pool.Reset();
+      return;
+    }
+  }
+
+  static void* Alloc(Group& group, const Operation& operation) {
+    void* const data = group.resource.allocate(operation.size, AlignmentOf(operation.size));
+    if (operation.action == Action::AllocZero) std::memset(data, 0, operation.size);
+    return data;
+  }
+
+  static void Free(Group* group, const Block& block) {
+    if (group != nullptr)
+      group->resource.deallocate(block.data, block.size, AlignmentOf(block.size));
+    else
+      std::free(block.data);
+  }
+
+  static void* AllocFromHeap(const Operation& operation) {
+    if (operation.action == Action::AllocZero) return std::calloc(1, operation.size);
+    if (operation.alignmentLog == 0) return std::malloc(operation.size);
+    void* data = nullptr;
+    const std::size_t alignment = std::size_t(1) << operation.alignmentLog;
+    return posix_memalign(&data, alignment, operation.size) == 0 ? data : nullptr;
+  }
+
+  static void Resize(Group* group, Block& block, std::uint32_t size) {
+    const Block old = block;
+    if (group == nullptr) {
+      block = {std::realloc(old.data, size), size};
+      if (block.data == nullptr) Fail("out of memory");
+    } else {
+      block = {group->resource.allocate(size, AlignmentOf(size)), size};
+      std::memcpy(block.data, old.data, size < old.size ? size : old.size);
+      Free(group, old);
+    }
+    Touch(block);
+  }
+
+  const OperationsHeader& header;
+  const std::span<const Operation> operations;
+  std::vector<Block> blocks;
+  std::vector<std::unique_ptr<Group>> groups;
+  const bool resets;
+  std::uint64_t at = 0;
+};
+
+const OperationsHeader& Map(const char* path) {
+  const int file = open(path, O_RDONLY | O_CLOEXEC);
+  struct stat state {};
+  if (file < 0 || fstat(file, &state) != 0) Fail("the operations can't be opened");
+  void* const memory = mmap(nullptr, static_cast<std::size_t>(state.st_size), PROT_READ,
+                            MAP_SHARED | MAP_POPULATE, file, 0);
+  if (memory == MAP_FAILED) Fail("the operations can't be mapped");
+  return *static_cast<const OperationsHeader*>(memory);
+}
+
+} // namespace
+
+/// FILE POOLED BUCKET MIN MAX ALIGNMENT KEEP RESET: POOLED has a bit for each group with a pool, a
+/// setting of 0 is "as set".
+int main(int argc, char** argv) {
+  if (argc != 9) Fail("started with other arguments than advise has");
+  const OperationsHeader& header = Map(argv[1]);
+  const auto* const first = reinterpret_cast<const Operation*>(&header + 1);
+  const auto number = [&](int i) {
+    return static_cast<unsigned>(std::strtoul(argv[i], nullptr, 10));
+  };
+  Options options;
+  options.On();
+  if (number(3) != 0) options.BucketSize(number(3));
+  if (number(4) != 0) options.MinRecordSize(number(4));
+  if (number(5) != 0) options.MaxRecordSize(number(5));
+  if (number(6) != 0) options.DataAlignment(number(6));
+  options.KeepEmptyBuckets(number(7) != 0);
+  Replay replay(header, {first, header.count}, options, std::strtoull(argv[2], nullptr, 10),
+                number(8) != 0);
+  const Figures figures = replay.Run();
+  std::printf("%llu %llu %llu\n", static_cast<unsigned long long>(figures.nanoseconds),
+              static_cast<unsigned long long>(figures.bytes),
+              static_cast<unsigned long long>(figures.bytesHeld));
+  std::fflush(stdout);
+  std::_Exit(0); // what is left isn't part of the replay
+}
