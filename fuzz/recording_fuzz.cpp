@@ -42,8 +42,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     Recording recording("fuzz", source);
     std::uint64_t blocks = 0, time = 0;
     for (RecordedEvent event; recording.Next(event); time = event.time) {
-      const bool isNew = event.kind != Entry::Free && event.kind != Entry::FreeUnknown;
-      blocks += isNew ? 1 : 0;
+      blocks += event.IsRequest() ? 1 : 0;
       if (event.block > blocks || event.old > blocks || event.time < time ||
           event.stack >= recording.stacks.size())
         std::abort();

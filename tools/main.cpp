@@ -59,6 +59,7 @@ int Run(int argc, char** argv) {
   Tools::AddTop(app);
   Tools::AddRecord(app);
   Tools::AddAdvise(app);
+  Tools::AddReplay(app);
   try {
     app.parse(argc, argv);
   } catch (const CLI::Success& help) {

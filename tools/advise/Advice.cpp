@@ -64,17 +64,11 @@ void Advice::JudgeSites() {
 /// Three series of rounds: each site alone, the grouping under settings and beside other
 /// allocators, and the best of these again, since the best of many is partly luck.
 void Advice::Replay() {
-  std::vector<std::uint8_t> groupOf(statistics.sites.size());
   const std::vector<std::uint32_t> candidates = FindCandidates(statistics, mostPooled);
   if (candidates.empty()) return;
-  for (std::size_t i = 0; i < candidates.size(); ++i)
-    groupOf[candidates[i]] = static_cast<std::uint8_t>(i + 1);
-  Recording again = OpenRecording(request.file);
-  const OperationsFile operations(again, statistics, groupOf, request.mostEvents);
-  firstEvent = operations.firstEvent;
-  lastEvent = operations.lastEvent;
-  isWhole = operations.IsWhole();
-
+  part = Part::Around(statistics.peakEvent, recording.numEvents, request.mostEvents);
+  OperationsFile operations(part);
+  WriteOperations(operations, candidates);
   const std::uint64_t pooled = ChooseGrouping(operations.GetPath());
   std::vector<Variant> variants = VariantsOf(pooled);
   Measure(operations.GetPath(), variants, request.rounds);
@@ -88,6 +82,19 @@ void Advice::Replay() {
     heap = last.front();
     best = Outcome{last.back(), DifferenceOf(last.back(), heap)};
   }
+}
+
+/// Each of the sites is a group, from 1 on.
+void Advice::WriteOperations(OperationsFile& operations,
+                             const std::vector<std::uint32_t>& pooled) const {
+  std::vector<std::uint8_t> groupOf(statistics.sites.size());
+  for (std::size_t i = 0; i < pooled.size(); ++i)
+    groupOf[pooled[i]] = static_cast<std::uint8_t>(i + 1);
+  Recording again = OpenRecording(request.file);
+  for (RecordedEvent event; again.Next(event);)
+    operations.Take(event,
+                    event.IsRequest() ? groupOf[statistics.GetSite(event.stack)] : std::uint8_t(0));
+  operations.Write();
 }
 
 /// Tries each candidate alone. The grouping has those that save time in the mean, or all if none
@@ -105,11 +112,13 @@ std::uint64_t Advice::ChooseGrouping(const std::string& operations) {
   for (std::size_t i = 0; i < tried.size(); ++i) {
     const Variant& variant = variants[i + 1];
     tried[i]->seconds = DifferenceOf(variant, variants.front());
-    tried[i]->isChosen = tried[i]->seconds->mean < 0;
     all |= variant.pooled;
-    chosen |= tried[i]->isChosen ? variant.pooled : 0;
+    if (tried[i]->seconds->mean < 0) chosen |= variant.pooled;
   }
-  return chosen != 0 ? chosen : all;
+  if (chosen == 0) chosen = all;
+  for (std::size_t i = 0; i < tried.size(); ++i)
+    tried[i]->isChosen = (chosen & variants[i + 1].pooled) != 0;
+  return chosen;
 }
 
 std::vector<Variant> Advice::VariantsOf(std::uint64_t pooled) const {

@@ -4,6 +4,7 @@
 #define VOK_MEMPOOL_TOOLS_ADVISE_ADVICE_H
 
 #include "advise/Measure.h"
+#include "advise/OperationsFile.h"
 #include "advise/Plan.h"
 #include "advise/Statistics.h"
 
@@ -19,7 +20,7 @@ namespace VOK::MemPool::Tools {
 struct AdviceRequest {
   std::string file;
   unsigned rounds = 10;
-  std::uint64_t mostEvents = 4000000; ///< that are replayed
+  std::uint64_t mostEvents = 8000000; ///< that are replayed
   bool measures = true;               ///< else statistics alone
 };
 
@@ -55,8 +56,8 @@ public:
   std::vector<SiteAdvice> sites; ///< by requests, the most first
 
   // Of the replays. Without candidates there are none.
-  std::uint64_t firstEvent = 0, lastEvent = 0;
-  bool isWhole = true;
+  Part part; ///< of the recording, that is replayed
+  bool IsWhole() const { return part.first == 0 && part.last >= recording.numEvents; }
   Variant heap;                  ///< of the last rounds
   std::vector<Outcome> outcomes; ///< of the grouping: settings, Reset, other allocators
   std::optional<Outcome> best;   ///< measured again, in rounds of its own
@@ -65,6 +66,7 @@ public:
 private:
   void JudgeSites();
   void Replay();
+  void WriteOperations(OperationsFile& operations, const std::vector<std::uint32_t>& pooled) const;
   std::uint64_t ChooseGrouping(const std::string& operations);
   std::vector<Variant> VariantsOf(std::uint64_t pooled) const;
   const Outcome* FindBest() const;

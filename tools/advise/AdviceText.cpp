@@ -132,8 +132,9 @@ std::string Advice::GetText() const {
 
   text += fmt::format("\nReplayed: {}, {} rounds in one thread, each in a process of its own. "
                       "Intervals of 95%.\n",
-                      isWhole ? "the whole recording"
-                              : fmt::format("events {} to {}", Count(firstEvent), Count(lastEvent)),
+                      IsWhole()
+                          ? "the whole recording"
+                          : fmt::format("events {} to {}", Count(part.first + 1), Count(part.last)),
                       request.rounds);
   text += fmt::format("  {:<32} {:>12}  {:<28} {:>14}\n", "", "time", "more than the heap",
                       "heap at peak");
@@ -213,8 +214,12 @@ nlohmann::ordered_json Advice::GetJson() const {
     json["samples"].push_back(std::move(entry));
   }
   if (outcomes.empty()) return json;
-  json["replay"] = {{"whole", isWhole},         {"first", firstEvent}, {"last", lastEvent},
-                    {"rounds", request.rounds}, {"pays", Pays()},      {"variants", Json::array()}};
+  json["replay"] = {{"whole", IsWhole()},
+                    {"first", part.first + 1},
+                    {"last", std::min(part.last, recording.numEvents)},
+                    {"rounds", request.rounds},
+                    {"pays", Pays()},
+                    {"variants", Json::array()}};
   for (const Outcome& outcome : outcomes)
     json["replay"]["variants"].push_back(JsonOf(outcome));
   if (best) {

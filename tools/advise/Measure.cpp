@@ -6,18 +6,12 @@
 
 #include <algorithm>
 #include <array>
-#include <cerrno>
 #include <cmath>
 #include <cstdio>
-#include <cstring>
 #include <filesystem>
 #include <fmt/format.h>
-#include <memory>
 #include <numeric>
-#include <spawn.h>
 #include <string_view>
-#include <sys/wait.h>
-#include <unistd.h>
 
 namespace VOK::MemPool::Tools {
 
@@ -46,30 +40,12 @@ struct Output {
   unsigned long long nanoseconds, bytes, bytesHeld;
 };
 
-Output Replay(const std::string& program, const std::string& operations, const Variant& variant) {
-  int ends[2];
-  if (pipe(ends) != 0) throw Failure(fmt::format("no pipe: {}", std::strerror(errno)));
-  posix_spawn_file_actions_t actions;
-  posix_spawn_file_actions_init(&actions);
-  posix_spawn_file_actions_adddup2(&actions, ends[1], STDOUT_FILENO);
-  posix_spawn_file_actions_addclose(&actions, ends[0]);
-  posix_spawn_file_actions_addclose(&actions, ends[1]);
-  std::vector<std::string> arguments = ArgumentsOf(variant, operations);
-  std::vector<std::string> variables = EnvironmentOf(variant);
-  pid_t child = 0;
-  const int error = posix_spawn(&child, program.c_str(), &actions, nullptr,
-                                Pointers(arguments).data(), Pointers(variables).data());
-  posix_spawn_file_actions_destroy(&actions);
-  close(ends[1]);
-  char text[200] = {};
-  const ssize_t length = error == 0 ? read(ends[0], text, sizeof text - 1) : 0;
-  close(ends[0]);
-  int status = 0;
-  if (error == 0) waitpid(child, &status, 0);
+Output Replay(const std::string& operations, const Variant& variant) {
+  const std::string text = RunProgram(FindHelper("vokmempool-replay"),
+                                      ArgumentsOf(variant, operations), EnvironmentOf(variant));
   Output output{};
-  if (error != 0 || status != 0 || length <= 0 ||
-      std::sscanf(text, "%llu %llu %llu", &output.nanoseconds, &output.bytes, &output.bytesHeld) !=
-          3)
+  if (std::sscanf(text.c_str(), "%llu %llu %llu", &output.nanoseconds, &output.bytes,
+                  &output.bytesHeld) != 3)
     throw Failure(fmt::format("the replay \"{}\" failed", variant.name));
   return output;
 }
@@ -122,17 +98,22 @@ Interval IntervalOf(const std::vector<double>& values) {
 }
 
 void Measure(const std::string& operations, std::vector<Variant>& variants, unsigned rounds) {
-  const std::string program = FindHelper("vokmempool-replay");
   Progress progress(rounds * variants.size(), "replays", 1);
   for (unsigned round = 0; round < rounds; ++round)
     for (std::size_t i = 0; i < variants.size(); ++i) {
       Variant& variant = variants[(i + round) % variants.size()];
-      const Output output = Replay(program, operations, variant);
+      const Output output = Replay(operations, variant);
       variant.seconds.push_back(static_cast<double>(output.nanoseconds) / 1e9);
       variant.bytes = output.bytes;
       variant.bytesHeld = output.bytesHeld;
       progress.Add(1);
     }
+}
+
+std::string ReportOf(const std::string& operations, const Variant& variant, bool detailed) {
+  std::vector<std::string> arguments = ArgumentsOf(variant, operations);
+  arguments.push_back(detailed ? "DbgDetailed" : "Dbg");
+  return RunProgram(FindHelper("vokmempool-replay"), arguments, EnvironmentOf(variant));
 }
 
 Interval DifferenceOf(const Variant& variant, const Variant& base) {

@@ -42,6 +42,9 @@ struct Variant {
 /// Replays each variant once in each of `rounds`. Fails if a replay does.
 void Measure(const std::string& operations, std::vector<Variant>& variants, unsigned rounds);
 
+/// The library's report of each pool after the operations.
+std::string ReportOf(const std::string& operations, const Variant& variant, bool detailed);
+
 /// The seconds that a variant takes more than another, round by round.
 Interval DifferenceOf(const Variant& variant, const Variant& base);
 

@@ -8,6 +8,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <ctime>
+#include <exception>
 #include <fcntl.h>
 #include <memory>
 #include <span>
@@ -69,6 +70,7 @@ struct Group {
   Group(const std::string& name, const Options& options) : pool(name, options), resource(pool) {}
   Mgr pool;
   Resource resource;
+  bool isUsed = false; ///< by an operation
 };
 
 /// What an object of that size needs, as far as one can know.
@@ -105,6 +107,12 @@ public:
     return figures;
   }
 
+  void Report(bool detailed) {
+    RunTo(header.count);
+    for (const auto& group : groups)
+      if (group && group->isUsed) detailed ? group->pool.DbgDetailed() : group->pool.Dbg();
+  }
+
 private:
   void RunTo(std::uint64_t end) {
     for (; at < end; ++at)
@@ -113,6 +121,7 @@ private:
 
   void Do(const Operation& operation) {
     Group* const group = groups[operation.group].get();
+    if (group != nullptr) group->isUsed = true;
     Block& block = blocks[operation.slot];
     switch (operation.action) {
     case Action::Alloc:
@@ -188,10 +197,10 @@ const OperationsHeader& Map(const char* path) {
 
 } // namespace
 
-/// FILE POOLED BUCKET MIN MAX ALIGNMENT KEEP RESET: POOLED has a bit for each group with a pool, a
-/// setting of 0 is "as set".
+/// FILE POOLED BUCKET MIN MAX ALIGNMENT KEEP RESET [Dbg | DbgDetailed]: POOLED has a bit for each
+/// group with a pool, a setting of 0 is "as set".
 int main(int argc, char** argv) {
-  if (argc != 9) Fail("started with other arguments than advise has");
+  if (argc != 9 && argc != 10) Fail("started with other arguments than vokmempool has");
   const OperationsHeader& header = Map(argv[1]);
   const auto* const first = reinterpret_cast<const Operation*>(&header + 1);
   const auto number = [&](int i) {
@@ -204,12 +213,20 @@ int main(int argc, char** argv) {
   if (number(5) != 0) options.MaxRecordSize(number(5));
   if (number(6) != 0) options.DataAlignment(number(6));
   options.KeepEmptyBuckets(number(7) != 0);
-  Replay replay(header, {first, header.count}, options, std::strtoull(argv[2], nullptr, 10),
-                number(8) != 0);
-  const Figures figures = replay.Run();
-  std::printf("%llu %llu %llu\n", static_cast<unsigned long long>(figures.nanoseconds),
-              static_cast<unsigned long long>(figures.bytes),
-              static_cast<unsigned long long>(figures.bytesHeld));
+  try {
+    Replay replay(header, {first, header.count}, options, std::strtoull(argv[2], nullptr, 10),
+                  number(8) != 0);
+    if (argc == 10) {
+      replay.Report(std::strcmp(argv[9], "DbgDetailed") == 0);
+    } else {
+      const Figures figures = replay.Run();
+      std::printf("%llu %llu %llu\n", static_cast<unsigned long long>(figures.nanoseconds),
+                  static_cast<unsigned long long>(figures.bytes),
+                  static_cast<unsigned long long>(figures.bytesHeld));
+    }
+  } catch (const std::exception& error) {
+    Fail(error.what());
+  }
   std::fflush(stdout);
   std::_Exit(0); // what is left isn't part of the replay
 }

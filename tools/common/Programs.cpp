@@ -2,10 +2,14 @@
 
 #include "common/Tool.h"
 
+#include <cerrno>
+#include <cstring>
 #include <filesystem>
 #include <fmt/format.h>
 #include <link.h>
 #include <set>
+#include <spawn.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 extern char** environ;
@@ -43,6 +47,32 @@ std::vector<char*> Pointers(std::vector<std::string>& texts) {
     pointers.push_back(text.data());
   pointers.push_back(nullptr);
   return pointers;
+}
+
+std::string RunProgram(const std::string& path, std::vector<std::string> arguments,
+                       std::vector<std::string> variables) {
+  int ends[2];
+  if (pipe(ends) != 0) throw Failure(fmt::format("no pipe: {}", std::strerror(errno)));
+  posix_spawn_file_actions_t actions;
+  posix_spawn_file_actions_init(&actions);
+  posix_spawn_file_actions_adddup2(&actions, ends[1], STDOUT_FILENO);
+  posix_spawn_file_actions_addclose(&actions, ends[0]);
+  posix_spawn_file_actions_addclose(&actions, ends[1]);
+  pid_t child = 0;
+  const int error = posix_spawn(&child, path.c_str(), &actions, nullptr, Pointers(arguments).data(),
+                                Pointers(variables).data());
+  posix_spawn_file_actions_destroy(&actions);
+  close(ends[1]);
+  std::string output;
+  char part[4096];
+  for (ssize_t length; error == 0 && (length = read(ends[0], part, sizeof part)) > 0;)
+    output.append(part, static_cast<std::size_t>(length));
+  close(ends[0]);
+  int status = 0;
+  if (error == 0) waitpid(child, &status, 0);
+  if (error != 0) throw Failure(fmt::format("{}: can't be run: {}", path, std::strerror(error)));
+  if (status != 0) throw Failure(fmt::format("{}: ended with status {}", path, status));
+  return output;
 }
 
 /// The folder of the C library's own file is the first of them.

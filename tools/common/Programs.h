@@ -21,6 +21,11 @@ std::vector<std::string> Environment(std::string_view without = {});
 /// As exec takes them. The texts must stay.
 std::vector<char*> Pointers(std::vector<std::string>& texts);
 
+/// Runs a program to its end and returns what it writes on standard output. Fails unless it exits
+/// with status 0.
+std::string RunProgram(const std::string& path, std::vector<std::string> arguments,
+                       std::vector<std::string> variables);
+
 /// Where the loader finds libraries of this machine.
 std::vector<std::string> LibraryFolders();
 

@@ -31,6 +31,7 @@ void AddInspect(CLI::App& app);
 void AddTop(CLI::App& app);
 void AddRecord(CLI::App& app);
 void AddAdvise(CLI::App& app);
+void AddReplay(CLI::App& app);
 
 } // namespace VOK::MemPool::Tools
 

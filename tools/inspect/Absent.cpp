@@ -21,5 +21,6 @@ void AddInspect(CLI::App& app) { AddAbsent(app, "inspect"); }
 void AddTop(CLI::App& app) { AddAbsent(app, "top"); }
 void AddRecord(CLI::App& app) { AddAbsent(app, "record"); }
 void AddAdvise(CLI::App& app) { AddAbsent(app, "advise"); }
+void AddReplay(CLI::App& app) { AddAbsent(app, "replay"); }
 
 } // namespace VOK::MemPool::Tools

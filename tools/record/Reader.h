@@ -23,6 +23,8 @@ struct RecordedEvent {
   std::uint64_t block = 0; ///< of Free the one released, else the new one; 0: unknown
   std::uint64_t old = 0;   ///< of Realloc: the one replaced
   std::uint64_t size = 0;
+
+  bool IsRequest() const { return kind != Entry::Free && kind != Entry::FreeUnknown; }
 };
 
 struct RecordedModule {
