@@ -20,8 +20,8 @@ namespace VOK::MemPool::Tools {
 struct AdviceRequest {
   std::string file;
   unsigned rounds = 10;
-  std::uint64_t mostEvents = 8000000; ///< that are replayed
-  bool measures = true;               ///< else statistics alone
+  std::uint64_t mostEvents = 20000000; ///< that are replayed
+  bool measures = true;                ///< else statistics alone
 };
 
 /// A call site with the most requests.

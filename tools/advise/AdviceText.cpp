@@ -12,6 +12,8 @@ namespace {
 
 using Json = nlohmann::ordered_json;
 
+constexpr std::ptrdiff_t leastShown = 3; // call sites, even with few requests
+
 std::string Count(std::uint64_t number) {
   const std::string digits = std::to_string(number);
   std::string text;

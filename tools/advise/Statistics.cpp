@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <bit>
+#include <fmt/format.h>
 #include <functional>
 
 namespace VOK::MemPool::Tools {
@@ -11,21 +12,16 @@ namespace {
 constexpr std::size_t mostSizes = 64;    // that a site tells apart
 constexpr std::size_t mostSamples = 400; // then every other one goes
 
-/// The name of a demangled function without its parameters, template arguments and result.
-std::string_view PlainName(std::string_view function) {
-  const std::string_view start = function.substr(0, function.find_first_of("<("));
-  return start.substr(std::min(start.rfind(' ') + 1, start.size()));
-}
-
-/// Allocators, and what the C++ runtime puts between them and a program.
+/// Allocators, this library's adaptors, and what the C++ runtime puts between them and a program.
 bool IsRuntime(const Location& where) {
   if (where.file.find("/include/c++/") != std::string::npos) return true;
-  if (where.function.starts_with("operator new") || where.function.starts_with("libstdc++.so") ||
-      where.function.starts_with("libc.so") || where.function.starts_with("ld-linux"))
-    return true;
-  const std::string_view name = PlainName(where.function);
-  return name.starts_with("std::") || name.starts_with("__gnu_cxx::") || name == "malloc" ||
-         name == "calloc" || name == "realloc" || name == "strdup" || name == "__strdup";
+  for (const char* const start : {"operator new", "libstdc++.so", "libc.so", "ld-linux"})
+    if (where.function.starts_with(start)) return true;
+  const std::string_view name = where.GetName();
+  for (const char* const start : {"std::", "__gnu_cxx::", "VOK::MemPool::"})
+    if (name.starts_with(start)) return true;
+  return name == "malloc" || name == "calloc" || name == "realloc" || name == "strdup" ||
+         name == "__strdup";
 }
 
 } // namespace
@@ -138,12 +134,12 @@ std::uint32_t Statistics::SiteOf(std::uint32_t stack) {
     sites.emplace_back();
     sites.back().where = place;
     for (auto inner = all.begin(); inner != where; ++inner)
-      sites.back().through.push_back(std::string(PlainName(inner->function)));
+      sites.back().through.push_back(std::string(inner->GetName()));
   }
   number = entry->second;
   std::string& callers = callersOfStack[stack];
   for (std::size_t i = 0; i < 3 && where != all.end() && ++where != all.end(); ++i)
-    callers += (callers.empty() ? "" : " < ") + std::string(PlainName(where->function));
+    callers += (callers.empty() ? "" : " < ") + std::string(where->GetName());
   return number;
 }
 

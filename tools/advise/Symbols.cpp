@@ -54,8 +54,16 @@ std::string CallFileOf(Dwarf_Die* unit, Dwarf_Die* call) {
 
 } // namespace
 
+std::string_view Location::GetName() const {
+  const std::string_view text = function;
+  const std::string_view start = text.substr(0, text.find_first_of("<(["));
+  const std::string_view name = start.substr(start.rfind(' ') + 1);
+  return name.empty() || text.starts_with("operator") ? text : name;
+}
+
 std::string Location::GetText() const {
-  return file.empty() ? function : fmt::format("{} ({}:{})", function, ShortName(file), line);
+  return file.empty() ? std::string(GetName())
+                      : fmt::format("{} ({}:{})", GetName(), ShortName(file), line);
 }
 
 void Symbols::Closer::operator()(Dwfl* open) const { dwfl_end(open); }

@@ -8,6 +8,7 @@
 #include <cstdint>
 #include <memory>
 #include <string>
+#include <string_view>
 #include <unordered_map>
 #include <vector>
 
@@ -22,7 +23,10 @@ struct Location {
   int line = 0;
 
   bool operator==(const Location&) const = default;
-  /// "function (file:line)", the file without its folder.
+  /// The function without its result, parameters and template arguments.
+  std::string_view GetName() const;
+
+  /// "name (file:line)", the file without its folder.
   std::string GetText() const;
 };
 

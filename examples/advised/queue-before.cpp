@@ -1,0 +1,25 @@
+// Messages of many sizes that wait in a short queue: few are live at a time.
+#include "Resident.h"
+
+#include <array>
+#include <cstddef>
+#include <iostream>
+#include <memory>
+#include <random>
+
+int main() {
+  constexpr std::size_t waiting = 100, messages = 5000000;
+  const long before = ResidentKiB();
+  std::array<std::unique_ptr<char[]>, waiting> queue;
+  std::minstd_rand random;
+  std::size_t sum = 0;
+  for (std::size_t i = 0; i < messages; ++i) {
+    const std::size_t size = 16 + random() % 400;
+    std::unique_ptr<char[]>& place = queue[i % waiting];
+    place.reset(new char[size]);
+    place[0] = static_cast<char>(size);
+    sum += static_cast<unsigned char>(place[0]);
+  }
+  std::cerr << "heap " << ResidentKiB() - before << " KiB\n";
+  std::cout << sum << '\n';
+}
