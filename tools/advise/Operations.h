@@ -37,8 +37,9 @@ struct OperationsHeader {
   std::uint64_t first; ///< the operations before it make what is live at the start; not timed
   std::uint64_t peak;  ///< the operation after which most bytes are live
   std::uint32_t slots;
-  std::uint32_t groups; ///< with the first one
-  std::uint64_t reserved[4];
+  std::uint32_t groups;  ///< with the first one
+  std::uint32_t isPlain; ///< the sizes are a pool's own; else an adaptor aligns the data
+  std::uint32_t reserved[7];
 };
 static_assert(sizeof(OperationsHeader) == 64);
 

@@ -27,7 +27,9 @@ Part Part::Around(std::uint64_t peak, std::uint64_t events, std::uint64_t most) 
   return {first, first + most};
 }
 
-OperationsFile::OperationsFile(const Part& part_) : part(part_), path(TemporaryName()) {
+OperationsFile::OperationsFile(const Part& part_, bool isPlain)
+    : part(part_), path(TemporaryName()) {
+  header.isPlain = isPlain ? 1 : 0;
   const int file = mkstemp(path.data());
   if (file < 0) throw Failure(fmt::format("{}: can't be made: {}", path, std::strerror(errno)));
   close(file);

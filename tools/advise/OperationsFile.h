@@ -24,7 +24,8 @@ struct Part {
 /// A file in memory, which goes with the object.
 class OperationsFile {
 public:
-  explicit OperationsFile(const Part& part);
+  /// `isPlain`: the sizes are what a pool was asked for, not what a program asked for.
+  explicit OperationsFile(const Part& part, bool isPlain = false);
   ~OperationsFile();
   OperationsFile(const OperationsFile&) = delete;
   OperationsFile& operator=(const OperationsFile&) = delete;

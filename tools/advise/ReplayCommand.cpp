@@ -106,9 +106,10 @@ std::uint64_t TakeTrace(const std::string& path, OperationsFile& operations) {
 }
 
 void Run(const Options& options) {
-  OperationsFile operations({0, options.reportAt.value_or(~std::uint64_t(0))});
-  const std::uint64_t events = IsRecording(options.file) ? TakeRecording(options.file, operations)
-                                                         : TakeTrace(options.file, operations);
+  const bool isRecording = IsRecording(options.file);
+  OperationsFile operations({0, options.reportAt.value_or(~std::uint64_t(0))}, !isRecording);
+  const std::uint64_t events =
+      isRecording ? TakeRecording(options.file, operations) : TakeTrace(options.file, operations);
   operations.Write();
   std::vector<Variant> variants{{.name = "heap"},
                                 {.name = "pool",

@@ -17,7 +17,7 @@ bool IsRuntime(const Location& where) {
   if (where.file.find("/include/c++/") != std::string::npos) return true;
   for (const char* const start : {"operator new", "libstdc++.so", "libc.so", "ld-linux"})
     if (where.function.starts_with(start)) return true;
-  const std::string_view name = where.GetName();
+  const std::string name = where.GetName();
   for (const char* const start : {"std::", "__gnu_cxx::", "VOK::MemPool::"})
     if (name.starts_with(start)) return true;
   return name == "malloc" || name == "calloc" || name == "realloc" || name == "strdup" ||
@@ -134,12 +134,12 @@ std::uint32_t Statistics::SiteOf(std::uint32_t stack) {
     sites.emplace_back();
     sites.back().where = place;
     for (auto inner = all.begin(); inner != where; ++inner)
-      sites.back().through.push_back(std::string(inner->GetName()));
+      sites.back().through.push_back(inner->GetName());
   }
   number = entry->second;
   std::string& callers = callersOfStack[stack];
   for (std::size_t i = 0; i < 3 && where != all.end() && ++where != all.end(); ++i)
-    callers += (callers.empty() ? "" : " < ") + std::string(where->GetName());
+    callers += (callers.empty() ? "" : " < ") + where->GetName();
   return number;
 }
 

@@ -1,5 +1,6 @@
 #include "advise/Symbols.h"
 
+#include <algorithm>
 #include <cstdlib>
 #include <cxxabi.h>
 #include <dwarf.h>
@@ -7,7 +8,7 @@
 #include <elfutils/libdwfl.h>
 #include <filesystem>
 #include <fmt/format.h>
-#include <optional>
+#include <string_view>
 
 namespace VOK::MemPool::Tools {
 
@@ -54,16 +55,18 @@ std::string CallFileOf(Dwarf_Die* unit, Dwarf_Die* call) {
 
 } // namespace
 
-std::string_view Location::GetName() const {
-  const std::string_view text = function;
-  const std::string_view start = text.substr(0, text.find_first_of("<(["));
-  const std::string_view name = start.substr(start.rfind(' ') + 1);
-  return name.empty() || text.starts_with("operator") ? text : name;
+std::string Location::GetName() const {
+  constexpr std::string_view unnamed = "(anonymous namespace)::";
+  std::string text = function;
+  for (std::size_t at = 0; (at = text.find(unnamed)) != text.npos;)
+    text.erase(at, unnamed.size());
+  if (text.starts_with("operator")) return text;
+  text.erase(std::min(text.find_first_of("<(["), text.size()));
+  return text.substr(text.rfind(' ') + 1);
 }
 
 std::string Location::GetText() const {
-  return file.empty() ? std::string(GetName())
-                      : fmt::format("{} ({}:{})", GetName(), ShortName(file), line);
+  return file.empty() ? GetName() : fmt::format("{} ({}:{})", GetName(), ShortName(file), line);
 }
 
 void Symbols::Closer::operator()(Dwfl* open) const { dwfl_end(open); }

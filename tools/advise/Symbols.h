@@ -8,7 +8,6 @@
 #include <cstdint>
 #include <memory>
 #include <string>
-#include <string_view>
 #include <unordered_map>
 #include <vector>
 
@@ -24,7 +23,7 @@ struct Location {
 
   bool operator==(const Location&) const = default;
   /// The function without its result, parameters and template arguments.
-  std::string_view GetName() const;
+  std::string GetName() const;
 
   /// "name (file:line)", the file without its folder.
   std::string GetText() const;

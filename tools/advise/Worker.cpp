@@ -73,12 +73,6 @@ struct Group {
   bool isUsed = false; ///< by an operation
 };
 
-/// What an object of that size needs, as far as one can know.
-std::size_t AlignmentOf(std::uint32_t size) {
-  constexpr std::uint32_t most = 8;
-  return size % most == 0 ? most : size & (0 - size);
-}
-
 class Replay {
 public:
   /// Only the groups in the bits of `pooled` have pools.
@@ -143,13 +137,20 @@ private:
     }
   }
 
-  static void* Alloc(Group& group, const Operation& operation) {
+  /// What an object of that size needs, as far as one can know.
+  std::size_t AlignmentOf(std::uint32_t size) const {
+    constexpr std::uint32_t most = 8;
+    if (header.isPlain != 0) return 1;
+    return size % most == 0 ? most : size & (0 - size);
+  }
+
+  void* Alloc(Group& group, const Operation& operation) const {
     void* const data = group.resource.allocate(operation.size, AlignmentOf(operation.size));
     if (operation.action == Action::AllocZero) std::memset(data, 0, operation.size);
     return data;
   }
 
-  static void Free(Group* group, const Block& block) {
+  void Free(Group* group, const Block& block) const {
     if (group != nullptr)
       group->resource.deallocate(block.data, block.size, AlignmentOf(block.size));
     else
@@ -164,7 +165,7 @@ private:
     return posix_memalign(&data, alignment, operation.size) == 0 ? data : nullptr;
   }
 
-  static void Resize(Group* group, Block& block, std::uint32_t size) {
+  void Resize(Group* group, Block& block, std::uint32_t size) const {
     const Block old = block;
     if (group == nullptr) {
       block = {std::realloc(old.data, size), size};

@@ -47,9 +47,10 @@ public:
   Session(const Options& options_, const std::string& folder_)
       : options(options_), folder(folder_) {}
 
-  /// One round; whether any process had something to write.
-  bool Take() {
-    Find();
+  /// One round; whether any process had something to write. New processes are looked for now and
+  /// then, or at once.
+  bool Take(bool looks) {
+    if (looks || std::chrono::steady_clock::now() >= nextLook) Find();
     bool any = false;
     for (Recorded& one : recorded) {
       const bool hasEnded = one.HasEnded(); // so that nothing comes after what is taken now
@@ -77,7 +78,6 @@ private:
 
   /// New rings, in the order of their time, which their names hold.
   void Find() {
-    if (!recorded.empty() && std::chrono::steady_clock::now() < nextLook) return;
     nextLook = std::chrono::steady_clock::now() + std::chrono::milliseconds(2);
     std::vector<std::filesystem::path> paths;
     for (const auto& entry : std::filesystem::directory_iterator(folder))
@@ -119,7 +119,7 @@ void Run(const Options& options) {
   for (;;) {
     if (isRunning && waitpid(child, &status, WNOHANG) == child) isRunning = false;
     const bool wasRunning = isRunning;
-    const bool any = session.Take();
+    const bool any = session.Take(!wasRunning);
     if (!wasRunning && session.IsDone()) break;
     if (!any) std::this_thread::sleep_for(std::chrono::microseconds(500));
   }

@@ -221,11 +221,11 @@ void AfterForkInChild() {
 __attribute__((constructor)) void Begin() {
   HasNext();
   Channel::Prepare();
-  if (Channel::GetDepth() > 0) {
-    Stack::Prepare();
-    pthread_atfork(nullptr, nullptr, AfterForkInChild);
-    isReady = true;
-  }
+  if (Channel::GetDepth() == 0) return;
+  Stack::Prepare();
+  pthread_atfork(nullptr, nullptr, AfterForkInChild);
+  Channel::IsOpen(); // so that a program's recording precedes those of its children
+  isReady = true;
 }
 
 } // namespace
