@@ -4,6 +4,7 @@
 #include <MemPool>
 #include <array>
 #include <cstddef>
+#include <cstring>
 #include <iostream>
 #include <random>
 
@@ -19,7 +20,7 @@ int main() {
     char*& place = queue[i % waiting];
     pool.Free(place);
     place = static_cast<char*>(pool.Alloc(size));
-    place[0] = static_cast<char>(size);
+    std::memset(&place[0], static_cast<int>(i), size);
     sum += static_cast<unsigned char>(place[0]);
   }
   std::cerr << "heap " << ResidentKiB() - before << " KiB\n";

@@ -1,8 +1,9 @@
-// Messages of many sizes that wait in a short queue: few are live at a time.
+// Messages of many sizes that are written and wait in a short queue: few are live at a time.
 #include "Resident.h"
 
 #include <array>
 #include <cstddef>
+#include <cstring>
 #include <iostream>
 #include <memory>
 #include <random>
@@ -17,7 +18,7 @@ int main() {
     const std::size_t size = 16 + random() % 400;
     std::unique_ptr<char[]>& place = queue[i % waiting];
     place.reset(new char[size]);
-    place[0] = static_cast<char>(size);
+    std::memset(&place[0], static_cast<int>(i), size);
     sum += static_cast<unsigned char>(place[0]);
   }
   std::cerr << "heap " << ResidentKiB() - before << " KiB\n";

@@ -139,7 +139,7 @@ void AddReplay(CLI::App& app) {
       "replay", "Replays a recording or a trace on the library, under settings to try");
   command
       ->add_option("FILE", options->file,
-                   "A file of record, or a program's output with trace "
+                   "a file of record, or a program's output with trace "
                    "lines")
       ->required();
   const auto size = [&](const char* name, unsigned& value) {
@@ -151,16 +151,18 @@ void AddReplay(CLI::App& app) {
   size("--max-record-size", options->settings.maxRecordSize);
   size("--min-record-size", options->settings.minRecordSize);
   command->add_flag("--keep-empty-buckets", options->settings.keepEmptyBuckets,
-                    "Keep buckets without a used record");
+                    "keep buckets without a used record");
   command->add_flag("--reset", options->resets,
-                    "Reset a pool in place of a row of releases that empties it");
-  command->add_option("--rounds", options->rounds, "Rounds of replays")
+                    "reset a pool in place of a row of releases that empties it");
+  command->add_option("--rounds", options->rounds, "rounds of replays")
       ->capture_default_str()
       ->check(NumberFrom(2u, 1000u, "a number of rounds"));
   CLI::Option* const at =
-      command->add_option("--report-at", options->reportAt, "Print the pools after this event")
+      command->add_option("--report-at", options->reportAt, "print the pools after this event")
           ->check(NumberFrom<std::uint64_t>(1, UINT64_MAX, "the number of an event"));
-  command->add_flag("--detailed", options->detailed, "The report with each record")->needs(at);
+  command->add_flag("--detailed", options->detailed, "each bucket with its records")->needs(at);
+  command->footer("Example: what would larger buckets take?\n"
+                  "  vokmempool replay --bucket-size 16000 vokmempool.rec");
   command->callback([options] { Run(*options); });
 }
 

@@ -66,7 +66,8 @@ std::string Location::GetName() const {
 }
 
 std::string Location::GetText() const {
-  return file.empty() ? GetName() : fmt::format("{} ({}:{})", GetName(), ShortName(file), line);
+  return file.empty() ? fmt::format("{}+0x{:x}", GetName(), offset)
+                      : fmt::format("{} ({}:{})", GetName(), ShortName(file), line);
 }
 
 void Symbols::Closer::operator()(Dwfl* open) const { dwfl_end(open); }
@@ -108,7 +109,7 @@ const std::vector<Location>& Symbols::ResolveFrame(std::uint64_t returnAddress) 
   Dwfl_Module* const module = dwfl_addrmodule(dwfl.get(), address);
   Location last;
   if (module == nullptr) {
-    last.function = fmt::format("0x{:x}", returnAddress);
+    last = {.function = "unknown", .file = {}, .offset = returnAddress};
     return all.push_back(last), all;
   }
   if (Dwfl_Line* const line = dwfl_module_getsrc(module, address)) {
@@ -124,8 +125,8 @@ const std::vector<Location>& Symbols::ResolveFrame(std::uint64_t returnAddress) 
     Dwarf_Addr start = 0;
     const char* const file =
         dwfl_module_info(module, nullptr, &start, nullptr, nullptr, nullptr, nullptr, nullptr);
-    last.function =
-        name != nullptr ? Demangled(name) : fmt::format("{}+0x{:x}", file, returnAddress - start);
+    last.function = name != nullptr ? Demangled(name) : file;
+    last.offset = name != nullptr ? offset + 1 : returnAddress - start;
     all.push_back(last);
   }
   return all;
@@ -149,7 +150,8 @@ void Symbols::AddInlined(Dwfl_Module* module, std::uint64_t address, Location& l
     if (tag == DW_TAG_subprogram) return;
     last = {.function = {},
             .file = CallFileOf(unit, &scopes[i]),
-            .line = static_cast<int>(NumberOf(&scopes[i], DW_AT_call_line))};
+            .line = static_cast<int>(NumberOf(&scopes[i], DW_AT_call_line)),
+            .offset = 0};
   }
 }
 

@@ -17,15 +17,16 @@ struct Dwfl_Module;
 namespace VOK::MemPool::Tools {
 
 struct Location {
-  std::string function; ///< demangled; without symbols, module and offset
+  std::string function; ///< demangled; without symbols, the module
   std::string file;     ///< empty without line tables
   int line = 0;
+  std::uint64_t offset = 0; ///< in the function, where there is no line
 
   bool operator==(const Location&) const = default;
   /// The function without its result, parameters and template arguments.
   std::string GetName() const;
 
-  /// "name (file:line)", the file without its folder.
+  /// "name (file:line)", the file without its folder, or "name+0xOFFSET".
   std::string GetText() const;
 };
 

@@ -65,21 +65,47 @@ std::uint64_t GetTime() {
          static_cast<std::uint64_t>(now.tv_nsec);
 }
 
-/// A pool as the adaptors use it.
+/// What an object of 8 bytes or of several times that may hold.
+struct alignas(8) Word {
+  unsigned char bytes[8];
+};
+
+/// A pool as a program uses it: with an adaptor where the data may need alignment.
 struct Group {
-  Group(const std::string& name, const Options& options) : pool(name, options), resource(pool) {}
+  Group(const std::string& name, const Options& options) : pool(name, options), words(pool) {}
   Mgr pool;
-  Resource resource;
+  Allocator<Word> words;
   bool isUsed = false; ///< by an operation
+};
+
+/// The operations, without those that a Reset spares the program, so that their reading costs
+/// nothing either.
+class Operations {
+public:
+  Operations(const OperationsHeader& whole, std::uint64_t pooled, bool resets) : header(whole) {
+    const std::span all(reinterpret_cast<const Operation*>(&whole + 1), whole.count);
+    list.reserve(whole.count); // growth would leave memory behind that the replay gets
+    for (std::uint64_t i = 0; i < whole.count; ++i) {
+      const bool isPooled = (pooled >> all[i].group & 1) != 0;
+      if (i == whole.first) header.first = list.size();
+      if (i == whole.peak) header.peak = list.size();
+      if (all[i].action == Action::Reset
+              ? resets && isPooled
+              : all[i].action != Action::FreeWithAll || !resets || !isPooled)
+        list.push_back(all[i]);
+    }
+    header.count = list.size();
+  }
+
+  OperationsHeader header;
+  std::vector<Operation> list;
 };
 
 class Replay {
 public:
   /// Only the groups in the bits of `pooled` have pools.
-  Replay(const OperationsHeader& header_, std::span<const Operation> operations_,
-         const Options& options, std::uint64_t pooled, bool resets_)
-      : header(header_), operations(operations_), blocks(header.slots), groups(header.groups),
-        resets(resets_) {
+  Replay(const Operations& all, const Options& options, std::uint64_t pooled)
+      : header(all.header), operations(all.list), blocks(header.slots), groups(header.groups) {
     for (std::uint32_t group = 1; group < header.groups; ++group)
       if ((pooled >> group & 1) != 0)
         groups[group] = std::make_unique<Group>("group " + std::to_string(group), options);
@@ -120,41 +146,38 @@ private:
     switch (operation.action) {
     case Action::Alloc:
     case Action::AllocZero:
-      block = {group != nullptr ? Alloc(*group, operation) : AllocFromHeap(operation),
+      block = {group != nullptr ? Alloc(*group, operation.size) : AllocFromHeap(operation),
                operation.size};
       if (block.data == nullptr) Fail("out of memory");
+      if (group != nullptr && operation.action == Action::AllocZero)
+        std::memset(block.data, 0, block.size);
       return Touch(block);
     case Action::FreeWithAll:
-      if (resets && group != nullptr) return;
-      [[fallthrough]];
     case Action::Free:
       return Free(group, block);
     case Action::Resize:
       return Resize(group, block, operation.size);
     case Action::Reset:
-      if (resets && group != nullptr) group->pool.Reset();
+      group->pool.Reset();
       return;
     }
   }
 
-  /// What an object of that size needs, as far as one can know.
-  std::size_t AlignmentOf(std::uint32_t size) const {
-    constexpr std::uint32_t most = 8;
-    if (header.isPlain != 0) return 1;
-    return size % most == 0 ? most : size & (0 - size);
+  bool NeedsWords(std::uint32_t size) const {
+    return header.isPlain == 0 && size % sizeof(Word) == 0 && size > 0;
   }
 
-  void* Alloc(Group& group, const Operation& operation) const {
-    void* const data = group.resource.allocate(operation.size, AlignmentOf(operation.size));
-    if (operation.action == Action::AllocZero) std::memset(data, 0, operation.size);
-    return data;
+  void* Alloc(Group& group, std::uint32_t size) const {
+    return NeedsWords(size) ? group.words.allocate(size / sizeof(Word)) : group.pool.Alloc(size);
   }
 
   void Free(Group* group, const Block& block) const {
-    if (group != nullptr)
-      group->resource.deallocate(block.data, block.size, AlignmentOf(block.size));
-    else
+    if (group == nullptr)
       std::free(block.data);
+    else if (NeedsWords(block.size))
+      group->words.deallocate(static_cast<Word*>(block.data), block.size / sizeof(Word));
+    else
+      group->pool.Free(block.data);
   }
 
   static void* AllocFromHeap(const Operation& operation) {
@@ -171,7 +194,7 @@ private:
       block = {std::realloc(old.data, size), size};
       if (block.data == nullptr) Fail("out of memory");
     } else {
-      block = {group->resource.allocate(size, AlignmentOf(size)), size};
+      block = {Alloc(*group, size), size};
       std::memcpy(block.data, old.data, size < old.size ? size : old.size);
       Free(group, old);
     }
@@ -182,7 +205,6 @@ private:
   const std::span<const Operation> operations;
   std::vector<Block> blocks;
   std::vector<std::unique_ptr<Group>> groups;
-  const bool resets;
   std::uint64_t at = 0;
 };
 
@@ -203,7 +225,6 @@ const OperationsHeader& Map(const char* path) {
 int main(int argc, char** argv) {
   if (argc != 9 && argc != 10) Fail("started with other arguments than vokmempool has");
   const OperationsHeader& header = Map(argv[1]);
-  const auto* const first = reinterpret_cast<const Operation*>(&header + 1);
   const auto number = [&](int i) {
     return static_cast<unsigned>(std::strtoul(argv[i], nullptr, 10));
   };
@@ -215,8 +236,9 @@ int main(int argc, char** argv) {
   if (number(6) != 0) options.DataAlignment(number(6));
   options.KeepEmptyBuckets(number(7) != 0);
   try {
-    Replay replay(header, {first, header.count}, options, std::strtoull(argv[2], nullptr, 10),
-                  number(8) != 0);
+    const std::uint64_t pooled = std::strtoull(argv[2], nullptr, 10);
+    const Operations operations(header, pooled, number(8) != 0);
+    Replay replay(operations, options, pooled);
     if (argc == 10) {
       replay.Report(std::strcmp(argv[9], "DbgDetailed") == 0);
     } else {

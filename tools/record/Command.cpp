@@ -1,149 +1,32 @@
 // vokmempool record: runs a program and records what it asks of its heap, a file for each process.
 // Test: tests/tools/record_test.py.
-#include "common/Files.h"
 #include "common/Numbers.h"
 #include "common/Tool.h"
-#include "record/Drain.h"
-#include "record/Launch.h"
+#include "record/Ring.h"
+#include "record/Session.h"
 
 #include <CLI/CLI.hpp>
-#include <algorithm>
-#include <csignal>
-#include <filesystem>
-#include <fmt/format.h>
-#include <poll.h>
-#include <set>
-#include <sys/syscall.h>
-#include <sys/wait.h>
-#include <thread>
-#include <unistd.h>
-#include <vector>
+#include <memory>
 
 namespace VOK::MemPool::Tools {
 
-namespace {
-
-struct Options {
-  std::string file = "vokmempool.rec";
-  unsigned depth = 8;
-  std::vector<std::string> program;
-};
-
-/// A process that has a ring.
-struct Recorded {
-  std::unique_ptr<Drain> drain;
-  int handle;          ///< readable once the process is gone; -1 if it was before
-  bool isOver = false; ///< another program runs in the process
-
-  bool HasEnded() const {
-    pollfd state{handle, POLLIN, 0};
-    return isOver || handle < 0 || poll(&state, 1, 0) > 0;
-  }
-};
-
-/// The processes of a recording, and their files.
-class Session {
-public:
-  Session(const Options& options_, const std::string& folder_)
-      : options(options_), folder(folder_) {}
-
-  /// One round; whether any process had something to write. New processes are looked for now and
-  /// then, or at once.
-  bool Take(bool looks) {
-    if (looks || std::chrono::steady_clock::now() >= nextLook) Find();
-    bool any = false;
-    for (Recorded& one : recorded) {
-      const bool hasEnded = one.HasEnded(); // so that nothing comes after what is taken now
-      any |= one.drain->Take();
-      if (hasEnded) End(one);
-    }
-    std::erase_if(recorded, [](const Recorded& one) { return one.drain == nullptr; });
-    return any;
-  }
-
-  bool IsDone() const { return recorded.empty(); }
-
-  void Say() const {
-    if (numFiles == 0) throw Failure("nothing was recorded: the program made no request");
-    fmt::print(stderr, "vokmempool: {} event{} of {} process{} in {}{}\n", numEvents,
-               numEvents == 1 ? "" : "s", numFiles, numFiles == 1 ? "" : "es", options.file,
-               numFiles > 1 ? fmt::format(" to {}", PathOf(numFiles)) : "");
-    if (numLost > 0) fmt::print(stderr, "vokmempool: {} events were lost\n", numLost);
-  }
-
-private:
-  std::string PathOf(unsigned number) const {
-    return number == 1 ? options.file : fmt::format("{}.{}", options.file, number);
-  }
-
-  /// New rings, in the order of their time, which their names hold.
-  void Find() {
-    nextLook = std::chrono::steady_clock::now() + std::chrono::milliseconds(2);
-    std::vector<std::filesystem::path> paths;
-    for (const auto& entry : std::filesystem::directory_iterator(folder))
-      if (entry.path().extension() == Record::ringSuffix) paths.push_back(entry.path());
-    std::ranges::sort(paths, {}, [](const auto& path) { return path.stem().extension().string(); });
-    for (const auto& path : paths) {
-      auto drain = std::make_unique<Drain>(path, PathOf(++numFiles), options.depth);
-      const int process = drain->GetProcess();
-      for (Recorded& earlier : recorded)
-        earlier.isOver |= earlier.drain->GetProcess() == process;
-      recorded.push_back({std::move(drain), static_cast<int>(syscall(SYS_pidfd_open, process, 0))});
-    }
-  }
-
-  void End(Recorded& one) {
-    one.drain->End();
-    numEvents += one.drain->GetNumEvents();
-    numLost += one.drain->GetNumLost();
-    one.drain = nullptr;
-    if (one.handle >= 0) close(one.handle);
-  }
-
-  const Options& options;
-  const std::string folder;
-  std::vector<Recorded> recorded;
-  std::chrono::steady_clock::time_point nextLook{};
-  unsigned numFiles = 0;
-  std::uint64_t numEvents = 0, numLost = 0;
-};
-
-void Run(const Options& options) {
-  const std::string program = FindProgram(options.program.front());
-  WriteFile(options.file, {}); // fails before the program starts
-  const RingFolder folder;
-  Session session(options, folder.GetPath());
-  const pid_t child = Launch(program, options.program, folder.GetPath(), options.depth);
-  int status = 0;
-  bool isRunning = true;
-  for (;;) {
-    if (isRunning && waitpid(child, &status, WNOHANG) == child) isRunning = false;
-    const bool wasRunning = isRunning;
-    const bool any = session.Take(!wasRunning);
-    if (!wasRunning && session.IsDone()) break;
-    if (!any) std::this_thread::sleep_for(std::chrono::microseconds(500));
-  }
-  session.Say();
-  throw ExitStatus{WIFSIGNALED(status) ? 128 + WTERMSIG(status) : WEXITSTATUS(status)};
-}
-
-} // namespace
-
 void AddRecord(CLI::App& app) {
-  auto options = std::make_shared<Options>();
+  auto request = std::make_shared<RecordRequest>();
   CLI::App* const command = app.add_subcommand(
       "record", "Runs a program and records what it asks of its heap, for advise and replay");
   command
-      ->add_option("-o,--output", options->file,
-                   "The recording; those of further processes are FILE.2, FILE.3, ...")
+      ->add_option("-o,--output", request->file,
+                   "the recording; those of further processes are FILE.2, FILE.3, ...")
       ->capture_default_str();
-  command->add_option("--depth", options->depth, "Return addresses kept of each call stack")
+  command->add_option("--depth", request->depth, "return addresses of each call stack")
       ->capture_default_str()
       ->check(NumberFrom(1u, Record::maxDepth, "a number of return addresses"));
-  command->add_option("PROGRAM", options->program, "The program and its arguments, after --")
+  command->add_option("PROGRAM", request->program, "the program and its arguments, after --")
       ->required();
   command->positionals_at_end();
-  command->callback([options] { Run(*options); });
+  command->footer("Example: would pools help?\n"
+                  "  vokmempool record -- ./program; vokmempool advise vokmempool.rec");
+  command->callback([request] { throw ExitStatus{RecordProgram(*request)}; });
 }
 
 } // namespace VOK::MemPool::Tools

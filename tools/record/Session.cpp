@@ -1,0 +1,123 @@
+#include "record/Session.h"
+
+#include "common/Files.h"
+#include "common/Tool.h"
+#include "record/Drain.h"
+#include "record/Launch.h"
+
+#include <algorithm>
+#include <chrono>
+#include <filesystem>
+#include <fmt/format.h>
+#include <memory>
+#include <poll.h>
+#include <sys/syscall.h>
+#include <sys/wait.h>
+#include <thread>
+#include <unistd.h>
+
+namespace VOK::MemPool::Tools {
+
+namespace {
+
+/// A process that has a ring.
+struct Recorded {
+  std::unique_ptr<Drain> drain;
+  int handle;          ///< readable once the process is gone; -1 if it was before
+  bool isOver = false; ///< another program runs in the process
+
+  bool HasEnded() const {
+    pollfd state{handle, POLLIN, 0};
+    return isOver || handle < 0 || poll(&state, 1, 0) > 0;
+  }
+};
+
+/// The processes of a recording, and their files.
+class Session {
+public:
+  Session(const RecordRequest& request_, const std::string& folder_)
+      : request(request_), folder(folder_) {}
+
+  /// One round; whether any process had something to write. New processes are looked for now and
+  /// then, or at once.
+  bool Take(bool looks) {
+    if (looks || std::chrono::steady_clock::now() >= nextLook) Find();
+    bool any = false;
+    for (Recorded& one : recorded) {
+      const bool hasEnded = one.HasEnded(); // so that nothing comes after what is taken now
+      any |= one.drain->Take();
+      if (hasEnded) End(one);
+    }
+    std::erase_if(recorded, [](const Recorded& one) { return one.drain == nullptr; });
+    return any;
+  }
+
+  bool IsDone() const { return recorded.empty(); }
+
+  void Say() const {
+    if (numFiles == 0) throw Failure("nothing was recorded: the program made no request");
+    fmt::print(stderr, "vokmempool: {} event{} of {} process{} in {}{}\n", numEvents,
+               numEvents == 1 ? "" : "s", numFiles, numFiles == 1 ? "" : "es", request.file,
+               numFiles > 1 ? fmt::format(" to {}", PathOf(numFiles)) : "");
+    if (numLost > 0) fmt::print(stderr, "vokmempool: {} events were lost\n", numLost);
+  }
+
+private:
+  std::string PathOf(unsigned number) const {
+    return number == 1 ? request.file : fmt::format("{}.{}", request.file, number);
+  }
+
+  /// New rings, in the order of their time, which their names hold.
+  void Find() {
+    nextLook = std::chrono::steady_clock::now() + std::chrono::milliseconds(2);
+    std::vector<std::filesystem::path> paths;
+    for (const auto& entry : std::filesystem::directory_iterator(folder))
+      if (entry.path().extension() == Record::ringSuffix) paths.push_back(entry.path());
+    std::ranges::sort(paths, {}, [](const auto& path) { return path.stem().extension().string(); });
+    for (const auto& path : paths) {
+      auto drain = std::make_unique<Drain>(path, PathOf(++numFiles), request.depth);
+      const int process = drain->GetProcess();
+      for (Recorded& earlier : recorded)
+        earlier.isOver |= earlier.drain->GetProcess() == process;
+      recorded.push_back({std::move(drain), static_cast<int>(syscall(SYS_pidfd_open, process, 0))});
+    }
+  }
+
+  void End(Recorded& one) {
+    one.drain->End();
+    numEvents += one.drain->GetNumEvents();
+    numLost += one.drain->GetNumLost();
+    one.drain = nullptr;
+    if (one.handle >= 0) close(one.handle);
+  }
+
+  const RecordRequest& request;
+  const std::string folder;
+  std::vector<Recorded> recorded;
+  std::chrono::steady_clock::time_point nextLook{};
+  unsigned numFiles = 0;
+  std::uint64_t numEvents = 0, numLost = 0;
+};
+
+} // namespace
+
+int RecordProgram(const RecordRequest& request) {
+  const std::string program = FindProgram(request.program.front());
+  WriteFile(request.file, {}); // fails before the program starts
+  const RingFolder folder;
+  Session session(request, folder.GetPath());
+  const pid_t child = Launch(program, request.program, folder.GetPath(), request.depth);
+  int status = 0;
+  bool isRunning = true;
+  for (;;) {
+    if (isRunning && waitpid(child, &status, WNOHANG) == child) isRunning = false;
+    const bool wasRunning = isRunning;
+    const bool any = session.Take(!wasRunning);
+    if (!wasRunning && session.IsDone()) break;
+    if (!any) std::this_thread::sleep_for(std::chrono::microseconds(500));
+  }
+  session.Say();
+  return WIFSIGNALED(status) ? 128 + WTERMSIG(status) : WEXITSTATUS(status);
+}
+
+} // namespace VOK::MemPool::Tools
