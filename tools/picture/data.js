@@ -84,7 +84,7 @@ class Bucket {
     return this.pool.faults.filter((fault) => fault.bucket === this.index && fault.record === record);
   }
 
-  // The codes are those of tools/picture/RecordBits.h.
+  // The codes are those of tools/picture/Data.cpp.
   unpackRecords() {
     const bits = new Bits(this.records);
     const type = new Uint8Array(this.count);

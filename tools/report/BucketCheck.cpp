@@ -1,5 +1,5 @@
 // The check of the buckets' reports: each against itself, its neighbours and the pool's tables.
-#include "report/Checker.h"
+#include "report/Check.h"
 #include "report/Form.h"
 
 #include <algorithm>

@@ -2,7 +2,6 @@
 #include "report/Check.h"
 
 #include "common/Files.h"
-#include "report/Checker.h"
 #include "report/Form.h"
 
 #include <algorithm>
@@ -237,11 +236,9 @@ private:
 
 } // namespace
 
-void CheckPool(const Report& report, Checker& checker) { PoolCheck(report, checker).Run(); }
-
 std::vector<Inconsistency> CheckReport(const Report& report) {
   Checker checker;
-  CheckPool(report, checker);
+  PoolCheck(report, checker).Run();
   CheckBuckets(report, checker);
   std::stable_sort(
       checker.found.begin(), checker.found.end(),

@@ -183,8 +183,6 @@ void FromJson(const Json& json, Report& report) {
     Refuse("bucketReports", "empty or an object for each bucket");
 }
 
-/// Takes the reports out of a document while it is parsed, bucket by bucket, and leaves in each
-/// array what isn't one: as values of the parser a large report takes many times its own size.
 /// Where a document can't be read on.
 std::string PlaceOf(std::string_view document, std::size_t byte) {
   const std::string_view before = document.substr(0, byte > 0 ? byte - 1 : 0);
@@ -200,6 +198,8 @@ std::string LastQuoted(std::string_view message) {
   return fmt::format("\"{}\"", message.substr(begin, end - begin));
 }
 
+/// Takes the reports out of a document while it is parsed, bucket by bucket, and leaves in each
+/// array what isn't one: as values of the parser a large report takes many times its own size.
 class Collector {
 public:
   std::vector<Report> reports;
