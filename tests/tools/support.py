@@ -6,6 +6,10 @@ import re
 import subprocess
 import sys
 from itertools import count
+from pathlib import Path
+
+sys.path.append(str(Path(__file__).resolve().parents[1]))
+from masking import masked  # for the tests
 
 PROGRAM, POOLS = sys.argv[1:3]
 
