@@ -42,7 +42,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     Recording recording("fuzz", source);
     std::uint64_t blocks = 0, time = 0;
     for (RecordedEvent event; recording.Next(event); time = event.time) {
-      blocks += event.IsRequest() ? 1 : 0;
+      if (event.IsRequest()) ++blocks;
       if (event.block > blocks || event.old > blocks || event.time < time ||
           event.stack >= recording.stacks.size())
         std::abort();

@@ -73,7 +73,7 @@ def main():
         whole = statistics.mean(pair[0][0] for pair in pairs)
         measured = interval([two[0] - one[0] for one, two in pairs])
         best = replay["best"]
-        foretold = [best["difference"][key] for key in ("mean", "low", "high")]
+        foretold = [replay["forecast"][key] for key in ("mean", "low", "high")]
         answer = best["name"] if replay["pays"] else f"don't; best: {best['name']}"
         print(f"| {name} | {answer} | {percent(foretold, whole)} | {percent(measured, whole)} "
               f"| {replay['heap']['bytes'] // 1024}, {best['bytes'] // 1024} "

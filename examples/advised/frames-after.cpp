@@ -54,7 +54,7 @@ int main() {
   for (int frame = 0; frame < frames; ++frame) {
     painter.MakeShapes();
     area += painter.Paint();
-    if (frame == 0) std::cerr << "heap " << ResidentKiB() - before << " KiB\n";
+    if (frame == frames - 1) std::cerr << "heap " << ResidentKiB() - before << " KiB\n";
     painter.DropShapes();
   }
   std::cout << area << '\n';

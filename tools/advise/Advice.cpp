@@ -1,6 +1,7 @@
 #include "advise/Advice.h"
 
 #include <algorithm>
+#include <cmath>
 #include <fmt/format.h>
 #include <functional>
 #include <numeric>
@@ -46,6 +47,13 @@ Advice::Advice(const AdviceRequest& request_)
   statistics.Read();
   JudgeSites();
   if (request.measures) Replay();
+}
+
+Interval Advice::GetForecast() const {
+  constexpr double modelError = 0.25;
+  const Interval& measured = best->difference;
+  const double more = modelError * std::abs(measured.mean);
+  return {measured.mean, measured.low - more, measured.high + more};
 }
 
 void Advice::JudgeSites() {

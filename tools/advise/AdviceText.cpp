@@ -91,9 +91,9 @@ std::string Advice::GetAnswer() const {
   const Interval whole = IntervalOf(heap.seconds);
   if (!Pays())
     return fmt::format("Don't: with the best pools found the heap's {:.1f} ms change by {}.",
-                       1e3 * whole.mean, Milliseconds(best->difference));
+                       1e3 * whole.mean, Milliseconds(GetForecast()));
   return fmt::format("A pool pays: {} of the heap's {:.1f} ms, as \"{}\".",
-                     Milliseconds(best->difference), 1e3 * whole.mean, best->variant.name);
+                     Milliseconds(GetForecast()), 1e3 * whole.mean, best->variant.name);
 }
 
 std::string Advice::GetText() const {
@@ -145,6 +145,9 @@ std::string Advice::GetText() const {
   if (!best) return text;
   text += fmt::format("\nThe best, measured again\n{}", OutcomeLine({heap, {}}));
   text += OutcomeLine(*best);
+  text += fmt::format("Expected in the program: {}, wider by a quarter of it for what a replay "
+                      "lacks\n",
+                      Milliseconds(GetForecast()));
   if (!Pays()) return text;
   text += fmt::format("\nSettings   {}\nor keys    {}\n", best->variant.settings.GetOptions(),
                       best->variant.settings.GetKeys());
@@ -227,6 +230,7 @@ nlohmann::ordered_json Advice::GetJson() const {
   if (best) {
     json["replay"]["heap"] = JsonOf(Outcome{heap, {}});
     json["replay"]["best"] = JsonOf(*best);
+    json["replay"]["forecast"] = JsonOf(GetForecast());
   }
   return json;
 }
