@@ -112,7 +112,7 @@ detailed         25         27          3      12349804      12349032  100.0 %
 
 # The words of a command line, and those that its last one can become.
 COMPLETIONS = [
-    ("", "--help --version report picture trace chart inspect top record advise replay"), ("re", "report"),
+    ("", "--help --version report picture trace chart inspect top record advise replay"), ("re", "report record replay"),
     ("report --s", "--summary --series"), ("picture -", "--help --output"), ("trace out", ""),
     ("report --diff before.txt --", "--help --from-json --lenient --records --summary --json --check "
      "--text --prometheus --series --diff"),
