@@ -13,7 +13,7 @@ constexpr int frames = 1500, shapes = 4000;
 constexpr std::uint32_t layers = 100;
 
 struct Shape {
-  float x, y, width, height;
+  double width, height;
   std::uint32_t colour, layer;
 };
 
@@ -22,7 +22,7 @@ public:
   void MakeShapes() {
     for (int i = 0; i < shapes; ++i) {
       const auto layer = static_cast<std::uint32_t>(random() % layers);
-      byLayer[layer].push_back(new (shapePool.allocate(1)) Shape{0, 0, 1, 2, 0, layer});
+      byLayer[layer].push_back(new (shapePool.allocate(1)) Shape{1, 2, 0, layer});
     }
   }
   double Paint() const {
