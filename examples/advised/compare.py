@@ -5,7 +5,8 @@ usage: compare.py BUILD [ROUNDS]   (a build of the preset release, after `ninja 
 
 Each program is recorded and advised, then it and its changed form run in turn for ROUNDS rounds (20
 by default). A row has both differences, as a share of the program's time before, with intervals of
-95%, and the heap at the peak. Times are the processor's.
+95%, and the heap at the peak. Times are the processor's. The changed form gets the settings of the
+advice from the environment.
 """
 import glob
 import json
@@ -23,17 +24,19 @@ INDEXED = ["--repeat", "20", *sorted(glob.glob(f"{os.path.dirname(__file__)}/../
 # Name, what is run before and after, relative to the build's folder of examples.
 PROGRAMS = [
     ("graph", ["advised/graph-before"], ["advised/graph-after"]),
-    ("queue", ["advised/queue-before"], ["advised/queue-after"]),
+    ("queue, 1,000 sizes", ["advised/queue-before", "1000"], ["advised/queue-after", "1000"]),
+    ("queue, 400 sizes", ["advised/queue-before", "400"], ["advised/queue-after", "400"]),
     ("frames", ["advised/frames-before"], ["advised/frames-after"]),
     ("word-index", ["word-index", "--heap", *INDEXED], ["word-index", *INDEXED]),
 ]
 FACTOR = 2.09  # Student's, for 95% and 20 rounds
 
 
-def run(command):
+def run(command, keys=()):
     """Seconds of the processor, and the heap that the program says in KiB."""
     before = resource.getrusage(resource.RUSAGE_CHILDREN)
-    done = subprocess.run(command, check=True, capture_output=True, text=True)
+    done = subprocess.run(command, check=True, capture_output=True, text=True,
+                          env={**os.environ, **dict(key.split("=") for key in keys)})
     after = resource.getrusage(resource.RUSAGE_CHILDREN)
     heap = re.search(r"heap (\d+) KiB|resident set in KiB: (\d+)", done.stderr + done.stdout)
     return (after.ru_utime - before.ru_utime + after.ru_stime - before.ru_stime,
@@ -69,10 +72,10 @@ def main():
         before, after = [[f"{build}/examples/{command[0]}", *command[1:]] for command in commands]
         with tempfile.TemporaryDirectory() as folder:
             replay = advise(f"{build}/tools/vokmempool", before, folder)
-        pairs = [(run(before), run(after)) for _ in range(rounds)]
+        best = replay["best"]
+        pairs = [(run(before), run(after, best["keys"].split())) for _ in range(rounds)]
         whole = statistics.mean(pair[0][0] for pair in pairs)
         measured = interval([two[0] - one[0] for one, two in pairs])
-        best = replay["best"]
         foretold = [replay["forecast"][key] for key in ("mean", "low", "high")]
         answer = best["name"] if replay["pays"] else f"don't; best: {best['name']}"
         print(f"| {name} | {answer} | {percent(foretold, whole)} | {percent(measured, whole)} "

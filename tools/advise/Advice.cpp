@@ -56,6 +56,16 @@ Interval Advice::GetForecast() const {
   return {measured.mean, measured.low - more, measured.high + more};
 }
 
+std::vector<std::string> Advice::GetChanges() const {
+  std::vector<std::string> changes;
+  for (const SiteAdvice& one : sites)
+    if (one.isChosen) changes.push_back(one.change);
+  if (best->variant.resets)
+    changes.emplace_back(
+        "Where all records of a pool die together: pool.Reset() in place of each Free");
+  return changes;
+}
+
 void Advice::JudgeSites() {
   std::vector<std::uint32_t> order(statistics.sites.size());
   std::iota(order.begin(), order.end(), 0u);

@@ -67,6 +67,9 @@ public:
   /// work, which runs beside the heap's.
   Interval GetForecast() const;
 
+  /// What to do in the source for the best.
+  std::vector<std::string> GetChanges() const;
+
   bool Pays() const { return best && GetForecast().high < 0; }
 
 private:

@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <fmt/format.h>
 #include <numeric>
+#include <span>
 #include <string_view>
 
 namespace VOK::MemPool::Tools {
@@ -12,7 +13,8 @@ namespace {
 
 using Json = nlohmann::ordered_json;
 
-constexpr std::ptrdiff_t leastShown = 3; // call sites, even with few requests
+constexpr double leastShare = 1;         // percent of what has a line of its own
+constexpr std::ptrdiff_t leastShown = 3; // call sites, even with fewer requests
 
 std::string Count(std::uint64_t number) {
   const std::string digits = std::to_string(number);
@@ -48,10 +50,17 @@ std::string SizesOf(const Site& site) {
 void AddCounts(std::string& text, const char* title, const LogCounts& counts) {
   const std::uint64_t all = std::accumulate(counts.begin(), counts.end(), std::uint64_t(0));
   text += fmt::format("\n{}\n", title);
+  std::uint64_t others = 0;
+  const auto add = [&](std::string_view name, std::uint64_t count) {
+    if (count > 0)
+      text += fmt::format("  {:>26} {:>14} {:5.1f}%\n", name, Count(count), Share(count, all));
+  };
   for (std::size_t i = 0; i < counts.size(); ++i)
-    if (counts[i] > 0)
-      text += fmt::format("  {:>26} {:>14} {:5.1f}%\n", RangeOf(i), Count(counts[i]),
-                          Share(counts[i], all));
+    if (Share(counts[i], all) >= leastShare)
+      add(RangeOf(i), counts[i]);
+    else
+      others += counts[i];
+  add("others", others);
 }
 
 Json JsonOf(const Interval& interval) {
@@ -62,6 +71,21 @@ Json JsonOf(const LogCounts& counts) {
   Json list = Json::array();
   for (std::size_t i = 0; i < counts.size(); ++i)
     if (counts[i] > 0) list.push_back({{"range", RangeOf(i)}, {"log", i}, {"count", counts[i]}});
+  return list;
+}
+
+/// Blocks by size and lifetime; those that are live at the end have none.
+Json BlocksOf(const Statistics& all) {
+  Json list = Json::array();
+  for (std::size_t size = 0; size < all.sizes.size(); ++size) {
+    std::uint64_t live = all.sizes[size];
+    for (std::size_t i = 0; i < all.released[size].size(); ++i)
+      if (const std::uint64_t count = all.released[size][i]; count > 0) {
+        list.push_back({{"size", size}, {"lifetime", i}, {"count", count}});
+        live -= count;
+      }
+    if (live > 0) list.push_back({{"size", size}, {"lifetime", nullptr}, {"count", live}});
+  }
   return list;
 }
 
@@ -114,10 +138,15 @@ std::string Advice::GetText() const {
   text +=
       fmt::format("At the end {} blocks of {} bytes live\n", Count(all.live), Count(all.liveBytes));
   AddCounts(text, "Size in bytes                     Requests", all.sizes);
-  AddCounts(text, "Lifetime in requests              Releases", all.lifetimes);
+  AddCounts(text, "Lifetime in requests              Releases", all.GetLifetimes());
 
   text += "\nCall sites, by requests\n";
-  for (const SiteAdvice& one : sites) {
+  const auto isShown = [&](const SiteAdvice& one) {
+    return Share(all.sites[one.site].requests, all.requests) >= leastShare;
+  };
+  const std::ptrdiff_t shown =
+      std::max(std::ranges::count_if(sites, isShown), std::min(std::ssize(sites), leastShown));
+  for (const SiteAdvice& one : std::span(sites).first(static_cast<std::size_t>(shown))) {
     const Site& site = all.sites[one.site];
     text +=
         fmt::format("  {:5.1f}%  {}\n", Share(site.requests, all.requests), site.where.GetText());
@@ -130,6 +159,9 @@ std::string Advice::GetText() const {
     if (one.seconds)
       text += fmt::format("          alone in a pool: {}\n", Milliseconds(*one.seconds));
   }
+  if (shown < std::ssize(all.sites))
+    text += fmt::format("  {} more, each with less than {:.0f}% of the requests\n",
+                        Count(all.sites.size() - static_cast<std::size_t>(shown)), leastShare);
   if (outcomes.empty()) return text;
 
   text += fmt::format("\nReplayed: {}, {} rounds in one thread, each in a process of its own. "
@@ -152,10 +184,8 @@ std::string Advice::GetText() const {
   text += fmt::format("\nSettings   {}\nor keys    {}\n", best->variant.settings.GetOptions(),
                       best->variant.settings.GetKeys());
   text += "\nWhat to change\n";
-  for (const SiteAdvice& one : sites)
-    if (one.isChosen) text += fmt::format("  {}\n", one.change);
-  if (best->variant.resets)
-    text += "  Where all records of a pool die together: pool.Reset() in place of each Free\n";
+  for (const std::string& change : GetChanges())
+    text += fmt::format("  {}\n", change);
   return text;
 }
 
@@ -176,7 +206,8 @@ nlohmann::ordered_json Advice::GetJson() const {
             {"live", all.live},
             {"liveBytes", all.liveBytes},
             {"sizes", JsonOf(all.sizes)},
-            {"lifetimes", JsonOf(all.lifetimes)}};
+            {"lifetimes", JsonOf(all.GetLifetimes())},
+            {"blocks", BlocksOf(all)}};
   json["sites"] = Json::array();
   for (const SiteAdvice& one : sites) {
     const Site& site = all.sites[one.site];
@@ -231,6 +262,7 @@ nlohmann::ordered_json Advice::GetJson() const {
     json["replay"]["heap"] = JsonOf(Outcome{heap, {}});
     json["replay"]["best"] = JsonOf(*best);
     json["replay"]["forecast"] = JsonOf(GetForecast());
+    json["replay"]["changes"] = GetChanges();
   }
   return json;
 }

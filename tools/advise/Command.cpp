@@ -3,6 +3,7 @@
 #include "advise/Advice.h"
 #include "common/Files.h"
 #include "common/Numbers.h"
+#include "common/Page.h"
 #include "common/Programs.h"
 #include "common/Tool.h"
 #include "record/Session.h"
@@ -16,11 +17,14 @@
 
 namespace VOK::MemPool::Tools {
 
+extern const Page advisePage;
+
 namespace {
 
 struct Options {
   AdviceRequest request;
   std::vector<std::string> words; ///< the recording's file, or the program
+  std::string page;               ///< a file, empty for none
   bool runs = false, json = false, noReplay = false;
 };
 
@@ -47,6 +51,8 @@ void Run(const Options& options) {
     throw CLI::ValidationError("FILE", "takes one file; a program is run with --run");
   request.measures = !options.noReplay;
   const Advice advice(request);
+  if (!options.page.empty()) WriteFile(options.page, FillPage(advisePage, advice.GetJson()));
+  if (options.page == "-") return;
   Print(options.json ? advice.GetJson().dump(2, ' ', false,
                                              nlohmann::ordered_json::error_handler_t::replace) +
                            "\n"
@@ -64,9 +70,11 @@ void AddAdvise(CLI::App& app) {
                    "a file of record; with --run a program and its "
                    "arguments, after --")
       ->required();
-  command->positionals_at_end();
   command->add_flag("--run", options->runs, "record the program first");
   command->add_flag("--json", options->json, "a JSON document");
+  command->add_option("--page", options->page,
+                      "also a page for the browser: its file, or - for the page alone on standard "
+                      "output");
   command->add_flag("--no-replay", options->noReplay, "statistics alone: nothing is measured");
   command->add_option("--rounds", options->request.rounds, "rounds of replays")
       ->capture_default_str()

@@ -34,16 +34,16 @@ static_assert(sizeof(Operation) == 12 && offsetof(Operation, action) == 8);
 
 struct OperationsHeader {
   std::uint64_t count;
-  std::uint64_t first; ///< the operations before it make what is live at the start; not timed
-  std::uint64_t peak;  ///< the operation after which most bytes are live
+  std::uint64_t first;   ///< the operations before it make what is live at the start; not timed
+  std::uint64_t peak;    ///< the operation after which most bytes are live
+  std::uint64_t aligned; ///< bit for each group whose data an adaptor aligns to 8
   std::uint32_t slots;
-  std::uint32_t groups;  ///< with the first one
-  std::uint32_t isPlain; ///< the sizes are a pool's own; else an adaptor aligns the data
-  std::uint32_t reserved[7];
+  std::uint32_t groups; ///< with the first one
+  std::uint32_t reserved[6];
 };
 static_assert(sizeof(OperationsHeader) == 64);
 
-constexpr unsigned mostGroups = 64;
+constexpr unsigned mostGroups = 64; // as bits of a number
 
 } // namespace VOK::MemPool::Tools
 

@@ -29,7 +29,7 @@ Part Part::Around(std::uint64_t peak, std::uint64_t events, std::uint64_t most) 
 
 OperationsFile::OperationsFile(const Part& part_, bool isPlain)
     : part(part_), path(TemporaryName()) {
-  header.isPlain = isPlain ? 1 : 0;
+  header.aligned = isPlain ? 0 : ~std::uint64_t(0);
   const int file = mkstemp(path.data());
   if (file < 0) throw Failure(fmt::format("{}: can't be made: {}", path, std::strerror(errno)));
   close(file);
@@ -86,6 +86,7 @@ void OperationsFile::Put(const Block& block, Action action) {
   Run& run = runs[block.group];
   run.frees.clear();
   if (action != Action::Resize) ++run.live;
+  if (block.size == 0 || block.size % 8 != 0) header.aligned &= ~(std::uint64_t(1) << block.group);
   live += block.size;
   if (live > peak) {
     peak = live;

@@ -24,7 +24,8 @@ struct Part {
 /// A file in memory, which goes with the object.
 class OperationsFile {
 public:
-  /// `isPlain`: the sizes are what a pool was asked for, not what a program asked for.
+  /// `isPlain`: the sizes are what a pool was asked for. Else what asks for multiples of 8 bytes
+  /// alone is taken for objects with pointers, which an adaptor aligns.
   explicit OperationsFile(const Part& part, bool isPlain = false);
   ~OperationsFile();
   OperationsFile(const OperationsFile&) = delete;

@@ -31,10 +31,20 @@ unsigned LogOf(std::uint64_t number) { return static_cast<unsigned>(std::bit_wid
 Statistics::Statistics(Recording& recording_) : recording(recording_), symbols(recording_) {}
 
 void Statistics::Read() {
+  AddSample();
   for (RecordedEvent event; recording.Next(event);) {
     Take(event);
-    if (recording.numEvents % interval == 0) AddSample(event);
+    if (recording.numEvents % interval == 0) AddSample();
   }
+  if (recording.numEvents % interval != 0) AddSample();
+}
+
+LogCounts Statistics::GetLifetimes() const {
+  LogCounts sums{};
+  for (const LogCounts& counts : released)
+    for (std::size_t i = 0; i < sums.size(); ++i)
+      sums[i] += counts[i];
+  return sums;
 }
 
 void Statistics::Take(const RecordedEvent& event) {
@@ -105,7 +115,7 @@ void Statistics::Remove(std::uint64_t number, std::uint32_t thread) {
   KeepPeak();
   Site& site = sites[block->site];
   const unsigned lifetime = LogOf(requests - block->request - 1);
-  ++lifetimes[lifetime];
+  ++released[LogOf(block->size)][lifetime];
   --live;
   liveBytes -= block->size;
   ++site.frees;
@@ -153,8 +163,8 @@ Statistics::GetCallers(std::uint32_t site) const {
   return sorted;
 }
 
-void Statistics::AddSample(const RecordedEvent& event) {
-  Sample sample{.event = recording.numEvents, .time = event.time, .liveBytes = {}};
+void Statistics::AddSample() {
+  Sample sample{.event = recording.numEvents, .time = time, .liveBytes = {}};
   for (const Site& site : sites)
     sample.liveBytes.push_back(site.liveBytes);
   samples.push_back(std::move(sample));

@@ -54,6 +54,9 @@ public:
   /// The site of a stack that was read.
   std::uint32_t GetSite(std::uint32_t stack) const { return siteOfStack[stack]; }
 
+  /// Releases by lifetime.
+  LogCounts GetLifetimes() const;
+
   /// What called a site, with the requests that came that way, the most first.
   std::vector<std::pair<std::string, std::uint64_t>> GetCallers(std::uint32_t site) const;
 
@@ -63,7 +66,8 @@ public:
   std::uint64_t live = 0, liveBytes = 0, peakBytes = 0, peakEvent = 0;
   std::uint32_t threads = 0;
   std::uint64_t time = 0;
-  LogCounts sizes{}, lifetimes{};
+  LogCounts sizes{};                    ///< requests
+  std::array<LogCounts, 65> released{}; ///< blocks by size and by lifetime
 
 private:
   struct LiveBlock {
@@ -79,7 +83,7 @@ private:
   void Remove(std::uint64_t block, std::uint32_t thread);
   std::uint32_t SiteOf(std::uint32_t stack);
   void KeepPeak();
-  void AddSample(const RecordedEvent& event);
+  void AddSample();
 
   Recording& recording;
   Symbols symbols;

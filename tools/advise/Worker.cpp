@@ -72,9 +72,22 @@ struct alignas(8) Word {
 
 /// A pool as a program uses it: with an adaptor where the data may need alignment.
 struct Group {
-  Group(const std::string& name, const Options& options) : pool(name, options), words(pool) {}
+  Group(const std::string& name, const Options& options, bool isAligned_)
+      : pool(name, options), words(pool), isAligned(isAligned_) {}
+
+  void* Alloc(std::uint32_t size) {
+    return isAligned ? words.allocate(size / sizeof(Word)) : pool.Alloc(size);
+  }
+  void Free(const Block& block) {
+    if (isAligned)
+      words.deallocate(static_cast<Word*>(block.data), block.size / sizeof(Word));
+    else
+      pool.Free(block.data);
+  }
+
   Mgr pool;
   Allocator<Word> words;
+  const bool isAligned;
   bool isUsed = false; ///< by an operation
 };
 
@@ -108,7 +121,8 @@ public:
       : header(all.header), operations(all.list), blocks(header.slots), groups(header.groups) {
     for (std::uint32_t group = 1; group < header.groups; ++group)
       if ((pooled >> group & 1) != 0)
-        groups[group] = std::make_unique<Group>("group " + std::to_string(group), options);
+        groups[group] = std::make_unique<Group>("group " + std::to_string(group), options,
+                                                (header.aligned >> group & 1) != 0);
   }
 
   Figures Run() {
@@ -146,7 +160,7 @@ private:
     switch (operation.action) {
     case Action::Alloc:
     case Action::AllocZero:
-      block = {group != nullptr ? Alloc(*group, operation.size) : AllocFromHeap(operation),
+      block = {group != nullptr ? group->Alloc(operation.size) : AllocFromHeap(operation),
                operation.size};
       if (block.data == nullptr) Fail("out of memory");
       if (group != nullptr && operation.action == Action::AllocZero)
@@ -163,21 +177,8 @@ private:
     }
   }
 
-  bool NeedsWords(std::uint32_t size) const {
-    return header.isPlain == 0 && size % sizeof(Word) == 0 && size > 0;
-  }
-
-  void* Alloc(Group& group, std::uint32_t size) const {
-    return NeedsWords(size) ? group.words.allocate(size / sizeof(Word)) : group.pool.Alloc(size);
-  }
-
-  void Free(Group* group, const Block& block) const {
-    if (group == nullptr)
-      std::free(block.data);
-    else if (NeedsWords(block.size))
-      group->words.deallocate(static_cast<Word*>(block.data), block.size / sizeof(Word));
-    else
-      group->pool.Free(block.data);
+  static void Free(Group* group, const Block& block) {
+    group != nullptr ? group->Free(block) : std::free(block.data);
   }
 
   static void* AllocFromHeap(const Operation& operation) {
@@ -188,13 +189,13 @@ private:
     return posix_memalign(&data, alignment, operation.size) == 0 ? data : nullptr;
   }
 
-  void Resize(Group* group, Block& block, std::uint32_t size) const {
+  static void Resize(Group* group, Block& block, std::uint32_t size) {
     const Block old = block;
     if (group == nullptr) {
       block = {std::realloc(old.data, size), size};
       if (block.data == nullptr) Fail("out of memory");
     } else {
-      block = {Alloc(*group, size), size};
+      block = {group->Alloc(size), size};
       std::memcpy(block.data, old.data, size < old.size ? size : old.size);
       Free(group, old);
     }

@@ -14,21 +14,6 @@ const height = 360;
 let place = lastPlace; // of the cursor
 let picked = null;
 
-function formatBytes(bytes) {
-  const units = ["bytes", "KiB", "MiB", "GiB", "TiB"];
-  let power = 0;
-  while (bytes >= 1024 && power < units.length - 1) {
-    bytes /= 1024;
-    ++power;
-  }
-  return `${power === 0 ? formatNumber(bytes) : bytes.toFixed(bytes < 10 ? 1 : 0)} ${units[power]}`;
-}
-
-function formatBoth(bytes) {
-  if (bytes === null) return "-";
-  return bytes < 1024 ? formatBytes(bytes) : `${formatBytes(bytes)} (${formatNumber(bytes)})`;
-}
-
 /** Null where the pool isn't there. */
 function pointAt(pool, at) {
   if (at > pool.points.at(-1)[0]) return null;
@@ -38,13 +23,6 @@ function pointAt(pool, at) {
 function totalAt(at) {
   const points = pools.map((pool) => pointAt(pool, at)).filter((point) => point !== null);
   return [1, 2].map((i) => points.reduce((sum, point) => sum + point[i], 0));
-}
-
-/** A power of two that gives four lines at most. */
-function stepOf(most) {
-  let step = 1;
-  while (most / step > 4) step *= 2;
-  return step;
 }
 
 function makeHead() {
@@ -78,11 +56,8 @@ function drawChart() {
     "aria-label": "Bytes over the lines of the text", keydown: onKey,
     pointermove: onPointer, pointerdown: onPointer,
   });
-  for (let bytes = 0, step = stepOf(most); bytes <= most; bytes += step)
-    svg.append(
-      make("line", { class: "grid", x1: margin.left, x2: width - margin.right, y1: scaleY(bytes), y2: scaleY(bytes) }),
-      make("text", { x: margin.left - 10, y: scaleY(bytes) + 4, "text-anchor": "end" }, formatBytes(bytes)));
   svg.append(
+    ...gridOf(most, width, margin, scaleY),
     make("text", { x: margin.left, y: height - 6 }, `line ${formatNumber(data.lines[0])}`),
     make("text", { x: width - margin.right, y: height - 6, "text-anchor": "end" }, formatNumber(data.lines[lastPlace])));
   for (const pool of shown)
@@ -114,10 +89,7 @@ function showPlace() {
 }
 
 function onPointer(event) {
-  const box = event.currentTarget.getBoundingClientRect();
-  const x = (event.clientX - box.left) / box.width * event.currentTarget.viewBox.baseVal.width;
-  const share = (x - margin.left) / (scaleX(Math.max(lastPlace, 1)) - margin.left);
-  place = Math.min(Math.max(Math.round(share * lastPlace), 0), lastPlace);
+  place = placeUnder(event, lastPlace, margin);
   showPlace();
 }
 
@@ -163,14 +135,13 @@ function showTable() {
   if (focused >= 0) document.querySelectorAll("tbody button")[focused].focus();
 }
 
-const lightness = matchMedia("(prefers-color-scheme: dark)").matches ? 64 : 42;
 for (const pool of pools) {
   pool.peak = Math.max(...pool.points.map((point) => point[measure]));
   pool.growth = pool.points.at(-1)[measure] - pool.points[0][measure];
 }
 pools.sort((a, b) => b.peak - a.peak);
 for (const [i, pool] of pools.entries())
-  pool.hue = `hsl(${(205 + i * 137.5) % 360} 58% ${lightness}%)`; // the golden angle, so that neighbours differ
+  pool.hue = hueOf(i);
 makeHead();
 drawChart();
 addEventListener("resize", drawChart);
