@@ -1,4 +1,5 @@
-// queue-before.cpp with a pool, against the advice. The environment has the settings of the best one.
+// queue-before.cpp with a pool, against the advice. The environment has the settings of the best
+// one.
 #include "Resident.h"
 
 #include <MemPool>

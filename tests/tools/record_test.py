@@ -1,7 +1,7 @@
 #!/usr/bin/env python3
 """Records a program that makes known requests, and compares what advise and replay say of it.
 
-usage: record_test.py VOKMEMPOOL POOL_CHILD HEAP_CHILD
+usage: record_test.py VOKMEMPOOL POOL_CHILD HEAP_CHILD [CHROMIUM]
 """
 import json
 import re
@@ -10,6 +10,7 @@ import tempfile
 from contextlib import chdir
 from pathlib import Path
 
+from browser import Browser
 from support import Work, data_of, run, same, tool, PROGRAM
 
 CHILD = sys.argv[3]
@@ -103,6 +104,37 @@ def test_advice():
     same(bool(re.search(r"Replayed: events [\d,]+ to [\d,]+, 2 rounds", text)), True, text)
 
 
+GAINS = """[...document.querySelectorAll('.gain')].map((row) =>
+  [...row.children].map((cell) => cell.textContent).filter((text) => text !== ''))"""
+CAPTION = "document.getElementById('caption').innerText"
+
+
+def test_page(browser):
+    """The page says what the text says."""
+    text = tool("advise", "rec", "--rounds", 2, "--events", 20000, "--page", "page.html")
+    browser.open("page.html")
+    same(browser.evaluate("document.querySelector('.answer').innerText"), text.split("\n")[0], "answer")
+    rows = [[name, difference or time, size] for name, time, difference, size in re.findall(
+        r"^  (\S.*?)  +([\d.]+ ms) +(?:(\S+ ms \[.*?\]) +)?([\d,]+ KiB)$", text, re.M)]
+    again, forecast = rows.pop(), re.search("Expected in the program: (.*]),", text).group(1)
+    same(browser.evaluate(GAINS), [*rows[:-1], [again[0] + ", again", *again[1:]],
+                                   ["expected in the program", forecast]], "the gains")
+    page = browser.evaluate("document.getElementById('sites').innerText")
+    sites = re.search(r"Call sites, by requests\n(.*?)\n\n", text, re.S).group(1)
+    same([line for line in sites.split("\n") if re.sub(r"^ +[\d.]*%? *", "", line) not in page], [],
+         "lines of the call sites that the page doesn't have")
+    same(browser.evaluate("data.blocks.reduce((sum, block) => sum + block.count, 0) === data.requests"),
+         True, "sizes against lifetimes")
+    browser.evaluate("document.querySelector('#live svg').focus()")
+    browser.press("Home")
+    same(browser.evaluate(CAPTION).split("\n")[:2], ["after event 0", "0 bytes"], "the start")
+    browser.evaluate("document.querySelector('#blocks svg').focus()")
+    browser.press("End")
+    same("live at the end" in browser.evaluate("document.getElementById('block').innerText"), True,
+         "the last column")
+    same(browser.messages, [], "messages in the console")
+
+
 def records(report):
     return report["header"]["usedRecs"] + report["header"]["extRecs"]
 
@@ -129,3 +161,6 @@ with tempfile.TemporaryDirectory() as folder, chdir(folder):
     test_refusals()
     test_advice()
     test_replay()
+    if len(sys.argv) > 4:
+        with Browser(sys.argv[4]) as chromium:
+            test_page(chromium)

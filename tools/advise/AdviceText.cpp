@@ -26,6 +26,10 @@ std::string Count(std::uint64_t number) {
   return text;
 }
 
+std::string Counted(std::uint64_t number, const char* one) {
+  return fmt::format("{} {}{}", Count(number), one, number == 1 ? "" : "s");
+}
+
 /// Lifetimes and sizes come by powers of two.
 std::string RangeOf(std::size_t log) {
   if (log == 0) return "0";
@@ -130,13 +134,12 @@ std::string Advice::GetText() const {
       fmt::format("Recording  {} events{}{}\n", Count(recording.numEvents),
                   recording.numLost > 0 ? fmt::format(", {} lost", Count(recording.numLost)) : "",
                   recording.isCut ? "; it is cut, and read to its last whole block" : "");
-  text += fmt::format("Requests   {} of {} bytes, {} of them realloc; {} thread{}\n",
-                      Count(all.requests), Count(all.bytes), Count(all.reallocs), all.threads,
-                      all.threads == 1 ? "" : "s");
+  text += fmt::format("Requests   {} of {} bytes, {} of them realloc; {}\n", Count(all.requests),
+                      Count(all.bytes), Count(all.reallocs), Counted(all.threads, "thread"));
   text += fmt::format("Peak       {} bytes live, after event {}\n", Count(all.peakBytes),
                       Count(all.peakEvent));
-  text +=
-      fmt::format("At the end {} blocks of {} bytes live\n", Count(all.live), Count(all.liveBytes));
+  text += fmt::format("At the end {} of {} live\n", Counted(all.live, "block"),
+                      Counted(all.liveBytes, "byte"));
   AddCounts(text, "Size in bytes                     Requests", all.sizes);
   AddCounts(text, "Lifetime in requests              Releases", all.GetLifetimes());
 
@@ -152,8 +155,8 @@ std::string Advice::GetText() const {
         fmt::format("  {:5.1f}%  {}\n", Share(site.requests, all.requests), site.where.GetText());
     if (const auto callers = all.GetCallers(one.site); !callers.front().first.empty())
       text += fmt::format("          from {}\n", callers.front().first);
-    text += fmt::format("          {} requests of {} bytes, {} bytes at the peak\n",
-                        Count(site.requests), SizesOf(site), Count(site.bytesAtPeak));
+    text += fmt::format("          {} of {} bytes, {} bytes at the peak\n",
+                        Counted(site.requests, "request"), SizesOf(site), Count(site.bytesAtPeak));
     text += fmt::format("          {}: {}\n", one.verdict.isCandidate ? "could have a pool" : "no",
                         one.verdict.reason);
     if (one.seconds)

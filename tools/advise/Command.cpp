@@ -9,10 +9,11 @@
 #include "record/Session.h"
 
 #include <CLI/CLI.hpp>
-#include <cstdlib>
+#include <algorithm>
+#include <filesystem>
+#include <fmt/format.h>
 #include <memory>
 #include <string>
-#include <unistd.h>
 #include <vector>
 
 namespace VOK::MemPool::Tools {
@@ -28,34 +29,34 @@ struct Options {
   bool runs = false, json = false, noReplay = false;
 };
 
-/// A file that goes with the object.
-class TemporaryFile {
-public:
-  TemporaryFile() : path(TemporaryName()) { close(mkstemp(path.data())); }
-  ~TemporaryFile() { unlink(path.c_str()); }
-  TemporaryFile(const TemporaryFile&) = delete;
-  TemporaryFile& operator=(const TemporaryFile&) = delete;
+/// Of several processes the one with the largest recording: a driver starts what does the work.
+std::string RecordLargest(const std::string& folder, const std::vector<std::string>& program) {
+  namespace fs = std::filesystem;
+  RecordProgram({.file = folder + "/recording", .isKept = false, .program = program});
+  const std::vector<fs::path> files{fs::directory_iterator(folder), {}};
+  if (files.size() > 1)
+    fmt::print(stderr, "vokmempool: the advice is for the process with the largest recording\n");
+  return *std::ranges::max_element(files, {}, [](const fs::path& file) { return file_size(file); });
+}
 
-  const std::string& GetPath() const { return path; }
-
-private:
-  std::string path;
-};
+/// Once it is there, no file is left of a program that was run.
+Advice MakeAdvice(const Options& options) {
+  const TemporaryFolder folder;
+  AdviceRequest request = options.request;
+  request.file =
+      options.runs ? RecordLargest(folder.GetPath(), options.words) : options.words.front();
+  request.measures = !options.noReplay;
+  return Advice(request);
+}
 
 void Run(const Options& options) {
-  AdviceRequest request = options.request;
-  const TemporaryFile own;
-  request.file = options.runs ? own.GetPath() : options.words.front();
-  if (options.runs) RecordProgram({.file = own.GetPath(), .program = options.words});
   if (!options.runs && options.words.size() > 1)
     throw CLI::ValidationError("FILE", "takes one file; a program is run with --run");
-  request.measures = !options.noReplay;
-  const Advice advice(request);
+  const Advice advice = MakeAdvice(options);
   if (!options.page.empty()) WriteFile(options.page, FillPage(advisePage, advice.GetJson()));
   if (options.page == "-") return;
-  Print(options.json ? advice.GetJson().dump(2, ' ', false,
-                                             nlohmann::ordered_json::error_handler_t::replace) +
-                           "\n"
+  using Json = nlohmann::ordered_json;
+  Print(options.json ? advice.GetJson().dump(2, ' ', false, Json::error_handler_t::replace) + "\n"
                      : advice.GetText());
 }
 

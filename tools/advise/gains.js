@@ -21,7 +21,7 @@ function barOf(one, range, isWide) {
 function gainOf(name, seconds, difference, bytes, range, kind) {
   return make("li", { class: `gain ${kind}` },
     make("span", { class: "name" }, name),
-    difference === null ? make("span", {}) : barOf(difference, range, kind.includes("forecast")),
+    difference === null ? make("span", { class: "none" }) : barOf(difference, range, kind.includes("forecast")),
     make("span", { class: "number difference" },
       difference === null ? `${(1e3 * seconds.mean).toFixed(1)} ms` : formatInterval(difference)),
     make("span", { class: "number" }, bytes === null ? "" : formatKiB(bytes)));

@@ -31,7 +31,7 @@ function siteOf(site) {
     make("span", { class: "share" }, `${(100 * site.requests / data.requests).toFixed(1)}%`),
     make("span", { class: "dot", style: `--hue: ${site.hue}` }), make("span", { class: "where" }, site.where),
     caller === "" ? null : make("p", { class: "quiet" }, `from ${caller}`),
-    make("p", {}, `${formatNumber(site.requests)} requests of ${site.sizes} bytes, ` +
+    make("p", {}, `${counted(site.requests, "request")} of ${site.sizes} bytes, ` +
       `${formatNumber(site.bytesAtPeak)} bytes at the peak`),
     make("p", { class: site.candidate ? "yes" : "quiet" },
       `${site.candidate ? "could have a pool" : "no"}: ${site.reason}`),

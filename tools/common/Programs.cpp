@@ -3,6 +3,7 @@
 #include "common/Tool.h"
 
 #include <cerrno>
+#include <cstdlib>
 #include <cstring>
 #include <filesystem>
 #include <fmt/format.h>
@@ -28,6 +29,17 @@ std::string FindHelper(const std::string& name) {
 std::string TemporaryName() {
   const bool hasMemory = access("/dev/shm", W_OK) == 0;
   return (hasMemory ? fs::path("/dev/shm") : fs::temp_directory_path()) / "vokmempool.XXXXXX";
+}
+
+TemporaryFolder::TemporaryFolder() {
+  path = TemporaryName();
+  if (mkdtemp(path.data()) == nullptr)
+    throw Failure(fmt::format("{}: can't be made: {}", path, std::strerror(errno)));
+}
+
+TemporaryFolder::~TemporaryFolder() {
+  std::error_code ignored;
+  fs::remove_all(path, ignored);
 }
 
 std::vector<std::string> Environment(std::string_view without) {

@@ -15,6 +15,20 @@ std::string FindHelper(const std::string& name);
 /// A folder in memory, or the one for temporary files, with a name for mkstemp or mkdtemp.
 std::string TemporaryName();
 
+/// A folder with such a name; it goes with the object.
+class TemporaryFolder {
+public:
+  TemporaryFolder();
+  ~TemporaryFolder();
+  TemporaryFolder(const TemporaryFolder&) = delete;
+  TemporaryFolder& operator=(const TemporaryFolder&) = delete;
+
+  const std::string& GetPath() const { return path; }
+
+private:
+  std::string path;
+};
+
 /// The variables of this process, but for LD_PRELOAD and those with a prefix.
 std::vector<std::string> Environment(std::string_view without = {});
 

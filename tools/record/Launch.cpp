@@ -89,17 +89,6 @@ void PassOn(int signal) { kill(launched, signal); }
 
 } // namespace
 
-RingFolder::RingFolder() {
-  path = TemporaryName();
-  if (mkdtemp(path.data()) == nullptr)
-    throw Failure(fmt::format("{}: can't be made: {}", path, std::strerror(errno)));
-}
-
-RingFolder::~RingFolder() {
-  std::error_code ignored;
-  fs::remove_all(path, ignored);
-}
-
 std::string FindProgram(const std::string& command) {
   const std::string path = SearchPath(command);
   CheckPreload(path);

@@ -8,20 +8,6 @@
 
 namespace VOK::MemPool::Tools {
 
-/// A folder in memory for the rings; it goes with the object.
-class RingFolder {
-public:
-  RingFolder();
-  ~RingFolder();
-  RingFolder(const RingFolder&) = delete;
-  RingFolder& operator=(const RingFolder&) = delete;
-
-  const std::string& GetPath() const { return path; }
-
-private:
-  std::string path;
-};
-
 /// The file of a command. Fails if there is none, or if no library can be preloaded into it.
 std::string FindProgram(const std::string& command);
 

@@ -1,6 +1,7 @@
 #include "record/Session.h"
 
 #include "common/Files.h"
+#include "common/Programs.h"
 #include "common/Tool.h"
 #include "record/Drain.h"
 #include "record/Launch.h"
@@ -56,9 +57,10 @@ public:
 
   void Say() const {
     if (numFiles == 0) throw Failure("nothing was recorded: the program made no request");
-    fmt::print(stderr, "vokmempool: {} event{} of {} process{} in {}{}\n", numEvents,
-               numEvents == 1 ? "" : "s", numFiles, numFiles == 1 ? "" : "es", request.file,
-               numFiles > 1 ? fmt::format(" to {}", PathOf(numFiles)) : "");
+    std::string files = request.isKept ? " in " + request.file : "";
+    if (request.isKept && numFiles > 1) files += " to " + PathOf(numFiles);
+    fmt::print(stderr, "vokmempool: {} event{} of {} process{}{}\n", numEvents,
+               numEvents == 1 ? "" : "s", numFiles, numFiles == 1 ? "" : "es", files);
     if (numLost > 0) fmt::print(stderr, "vokmempool: {} events were lost\n", numLost);
   }
 
@@ -104,7 +106,7 @@ private:
 int RecordProgram(const RecordRequest& request) {
   const std::string program = FindProgram(request.program.front());
   WriteFile(request.file, {}); // fails before the program starts
-  const RingFolder folder;
+  const TemporaryFolder folder;
   Session session(request, folder.GetPath());
   const pid_t child = Launch(program, request.program, folder.GetPath(), request.depth);
   int status = 0;

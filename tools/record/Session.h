@@ -10,6 +10,7 @@ namespace VOK::MemPool::Tools {
 
 struct RecordRequest {
   std::string file = "vokmempool.rec"; ///< of the first process; those of others are FILE.2, ...
+  bool isKept = true;                  ///< else no one needs its name
   unsigned depth = 8;                  ///< of call stacks, in return addresses
   std::vector<std::string> program;    ///< with its arguments
 };
