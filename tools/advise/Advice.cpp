@@ -4,6 +4,7 @@
 #include <cmath>
 #include <fmt/format.h>
 #include <functional>
+#include <limits>
 #include <numeric>
 
 namespace VOK::MemPool::Tools {
@@ -31,6 +32,33 @@ std::string ChangeOf(const Site& site) {
                        "Allocator<T>(pool)",
                        at);
   return fmt::format("{}: pool.Alloc(size) and pool.Free(pointer) in place of malloc and free", at);
+}
+
+/// A variant under one more change of its settings, each in turn.
+std::vector<Variant> ChangesOf(const Variant& base) {
+  std::vector<Variant> variants;
+  const auto add = [&](auto change) {
+    Variant variant{
+        .name = {}, .pooled = base.pooled, .settings = base.settings, .resets = base.resets};
+    change(variant.settings, variant.resets);
+    variant.name = variant.GetName();
+    variants.push_back(std::move(variant));
+  };
+  add([](PoolSettings& one, bool&) { one.keepEmptyBuckets = true; });
+  for (const unsigned bytes : {16000u, 65535u})
+    add([bytes](PoolSettings& one, bool&) { one.bucketSize = bytes; });
+  if (base.settings.maxRecordSize == 0)
+    add([](PoolSettings& one, bool&) {
+      one.bucketSize = 1004;
+      one.maxRecordSize = 240;
+    });
+  add([](PoolSettings& one, bool&) { one.minRecordSize = 64; });
+  add([](PoolSettings& one, bool&) {
+    one.dataAlignment = 16;
+    one.maxRecordSize = one.maxRecordSize / 16 * 16 + (one.maxRecordSize > 0 ? 16 : 0);
+  });
+  add([](PoolSettings&, bool& resets) { resets = true; });
+  return variants;
 }
 
 std::vector<Outcome> OutcomesOf(const std::vector<Variant>& variants) {
@@ -79,8 +107,9 @@ void Advice::JudgeSites() {
                      .seconds = std::nullopt});
 }
 
-/// Three series of rounds: each site alone, the grouping under settings and beside other
-/// allocators, and the best of these again, since the best of many is partly luck.
+/// Four series of rounds: each site alone; the grouping under each change of a setting, beside
+/// other allocators; each further change of the best of these; and the best again, since the best
+/// of many is partly luck.
 void Advice::Replay() {
   const std::vector<std::uint32_t> candidates = FindCandidates(statistics, mostPooled);
   if (candidates.empty()) return;
@@ -88,18 +117,21 @@ void Advice::Replay() {
   OperationsFile operations(part);
   WriteOperations(operations, candidates);
   const std::uint64_t pooled = ChooseGrouping(operations.GetPath());
-  std::vector<Variant> variants = VariantsOf(pooled);
-  Measure(operations.GetPath(), variants, request.rounds);
-  outcomes = OutcomesOf(variants);
-  heap = variants.front();
-  if (const Outcome* const found = FindBest(); found != nullptr) {
-    std::vector<Variant> last{variants.front(), found->variant};
-    for (Variant& variant : last)
-      variant.seconds.clear();
-    Measure(operations.GetPath(), last, request.rounds);
-    heap = last.front();
-    best = Outcome{last.back(), DifferenceOf(last.back(), heap)};
-  }
+  const Variant plain = PlainPools(pooled);
+  std::vector<Variant> variants = ChangesOf(plain);
+  variants.insert(variants.begin(), plain);
+  for (const auto& [name, path] : FindAllocators())
+    variants.push_back({.name = name, .allocator = path});
+  Try(operations.GetPath(), std::move(variants));
+  variants = ChangesOf(FindBest().variant);
+  std::erase_if(variants, [&](const Variant& variant) { return WasTried(variant.name); });
+  Try(operations.GetPath(), std::move(variants));
+
+  std::vector<Variant> last{{.name = "heap"}, FindBest().variant};
+  last.back().seconds.clear();
+  Measure(operations.GetPath(), last, request.rounds);
+  heap = last.front();
+  best = Outcome{last.back(), DifferenceOf(last.back(), heap)};
 }
 
 /// Each of the sites is a group, from 1 on.
@@ -139,49 +171,43 @@ std::uint64_t Advice::ChooseGrouping(const std::string& operations) {
   return chosen;
 }
 
-std::vector<Variant> Advice::VariantsOf(std::uint64_t pooled) const {
-  // Larger requests of the sites would be blocks of their own.
-  PoolSettings plain;
+/// Pools as set. Larger requests of the sites than they serve would be blocks of their own.
+Variant Advice::PlainPools(std::uint64_t pooled) const {
+  Variant plain{.name = "pools", .pooled = pooled};
   constexpr std::uint64_t defaultRecord = 996, alignment = 4;
   for (const SiteAdvice& one : sites)
     if (const std::uint64_t size = statistics.sites[one.site].maxSize;
         one.isChosen && size + 8 > defaultRecord && size < 8000)
-      plain.maxRecordSize =
-          std::max(plain.maxRecordSize, static_cast<unsigned>((size + 8 + alignment) / 4 * 4));
-  std::vector<Variant> variants{{.name = "heap"}};
-  const auto add = [&](const char* name, auto change, bool resets = false) {
-    PoolSettings settings = plain;
-    change(settings);
-    variants.push_back({.name = name, .pooled = pooled, .settings = settings, .resets = resets});
-  };
-  add("pools", [](PoolSettings&) {});
-  add("pools that keep empty buckets", [](PoolSettings& one) { one.keepEmptyBuckets = true; });
-  add(
-      "pools with Reset", [](PoolSettings&) {}, true);
-  add("pools, buckets of 16,000 bytes", [](PoolSettings& one) { one.bucketSize = 16000; });
-  add("pools, buckets of 65,535 bytes", [](PoolSettings& one) { one.bucketSize = 65535; });
-  if (plain.maxRecordSize == 0)
-    add("pools, buckets of 1,004 bytes", [](PoolSettings& one) {
-      one.bucketSize = 1004;
-      one.maxRecordSize = 240;
-    });
-  add("pools, data alignment 16", [](PoolSettings& one) {
-    one.dataAlignment = 16;
-    one.maxRecordSize = one.maxRecordSize / 16 * 16 + (one.maxRecordSize > 0 ? 16 : 0);
-  });
-  for (const auto& [name, path] : FindAllocators())
-    variants.push_back({.name = name, .allocator = path});
-  return variants;
+      plain.settings.maxRecordSize = std::max(
+          plain.settings.maxRecordSize, static_cast<unsigned>((size + 8 + alignment) / 4 * 4));
+  return plain;
 }
 
-/// The fastest with pools. Where only other allocators pay, that is an answer as well.
-const Outcome* Advice::FindBest() const {
-  const Outcome* found = nullptr;
-  for (const Outcome& outcome : outcomes)
-    if (outcome.variant.pooled != 0 &&
-        (found == nullptr || outcome.difference.mean < found->difference.mean))
-      found = &outcome;
-  return found;
+/// Measures these beside the heap.
+void Advice::Try(const std::string& operations, std::vector<Variant> variants) {
+  variants.insert(variants.begin(), Variant{.name = "heap"});
+  Measure(operations, variants, request.rounds);
+  std::vector<Outcome> found = OutcomesOf(variants);
+  if (!outcomes.empty()) found.erase(found.begin()); // the heap has its row
+  outcomes.insert(outcomes.end(), found.begin(), found.end());
+}
+
+bool Advice::WasTried(const std::string& name) const {
+  return std::ranges::any_of(outcomes,
+                             [&](const Outcome& outcome) { return outcome.variant.name == name; });
+}
+
+/// The fastest with pools, or what was tried before it and isn't slower beyond its interval: fewer
+/// settings come first.
+const Outcome& Advice::FindBest() const {
+  const auto secondsOf = [](const Outcome& outcome) {
+    return outcome.variant.pooled != 0 ? outcome.difference.mean
+                                       : std::numeric_limits<double>::infinity();
+  };
+  const Outcome& fastest = *std::ranges::min_element(outcomes, {}, secondsOf);
+  return *std::ranges::find_if(outcomes, [&](const Outcome& outcome) {
+    return secondsOf(outcome) <= fastest.difference.high;
+  });
 }
 
 } // namespace VOK::MemPool::Tools

@@ -77,8 +77,10 @@ private:
   void Replay();
   void WriteOperations(OperationsFile& operations, const std::vector<std::uint32_t>& pooled) const;
   std::uint64_t ChooseGrouping(const std::string& operations);
-  std::vector<Variant> VariantsOf(std::uint64_t pooled) const;
-  const Outcome* FindBest() const;
+  Variant PlainPools(std::uint64_t pooled) const;
+  void Try(const std::string& operations, std::vector<Variant> variants);
+  bool WasTried(const std::string& name) const;
+  const Outcome& FindBest() const;
 };
 
 } // namespace VOK::MemPool::Tools

@@ -105,7 +105,7 @@ Json JsonOf(const Outcome& outcome) {
 }
 
 std::string OutcomeLine(const Outcome& outcome) {
-  return fmt::format("  {:<32} {:>9.1f} ms  {:<28} {:>10} KiB\n", outcome.variant.name,
+  return fmt::format("  {:<40} {:>9.1f} ms  {:<28} {:>10} KiB\n", outcome.variant.name,
                      1e3 * IntervalOf(outcome.variant.seconds).mean,
                      outcome.variant.name == "heap" ? "" : Milliseconds(outcome.difference),
                      Count(outcome.variant.bytes / 1024));
@@ -173,7 +173,7 @@ std::string Advice::GetText() const {
                           ? "the whole recording"
                           : fmt::format("events {} to {}", Count(part.first + 1), Count(part.last)),
                       request.rounds);
-  text += fmt::format("  {:<32} {:>12}  {:<28} {:>14}\n", "", "time", "more than the heap",
+  text += fmt::format("  {:<40} {:>12}  {:<28} {:>14}\n", "", "time", "more than the heap",
                       "heap at peak");
   for (const Outcome& outcome : outcomes)
     text += OutcomeLine(outcome);

@@ -79,6 +79,19 @@ std::string PoolSettings::GetKeys() const {
   return "ZOR_VOK_MEMPOOL_ON=1" + (more.empty() ? "" : " " + more);
 }
 
+std::string Variant::GetName() const {
+  std::string text = "pools";
+  const auto add = [&](const char* word, unsigned number) {
+    if (number != 0) text += fmt::format(", {} {}", word, number);
+  };
+  if (resets) text += ", Reset";
+  if (settings.keepEmptyBuckets) text += ", kept";
+  add("buckets of", settings.bucketSize);
+  add("records from", settings.minRecordSize);
+  add("alignment", settings.dataAlignment);
+  return text;
+}
+
 Interval IntervalOf(const std::vector<double>& values) {
   // The factors of Student's distribution for 95%, by degrees of freedom.
   constexpr std::array factors{12.706, 4.303, 3.182, 2.776, 2.571, 2.447, 2.365, 2.306,

@@ -34,6 +34,9 @@ struct Variant {
   bool resets = false;
   std::string allocator{}; ///< a library to preload
 
+  /// What a variant with pools is called: what differs from pools as set.
+  std::string GetName() const;
+
   std::vector<double> seconds{}; ///< of each round
   std::uint64_t bytes = 0;       ///< resident in the heap at the peak
   std::uint64_t bytesHeld = 0;   ///< by the pools, at their own peaks
