@@ -5,8 +5,9 @@ usage: compare.py BUILD [ROUNDS]   (a build of the preset release, after `ninja 
 
 Each program is recorded and advised, then it and its changed form run in turn for ROUNDS rounds (20
 by default). A row has both differences, as a share of the program's time before, with intervals of
-95%, and the heap at the peak. Times are the processor's. The changed form gets the settings of the
-advice from the environment.
+95%, and the heap at the peak. Times are the processor's. What is foretold is a share of the times of
+runs around the advice, since a machine isn't always as fast. The changed form gets the settings of
+the advice from the environment.
 """
 import glob
 import json
@@ -70,15 +71,17 @@ def main():
     print("|---|---|--:|--:|--:|--:|")
     for name, *commands in PROGRAMS:
         before, after = [[f"{build}/examples/{command[0]}", *command[1:]] for command in commands]
+        around = [run(before)[0] for _ in range(rounds // 2)]
         with tempfile.TemporaryDirectory() as folder:
             replay = advise(f"{build}/tools/vokmempool", before, folder)
+        around += [run(before)[0] for _ in range(rounds // 2)]
         best = replay["best"]
         pairs = [(run(before), run(after, best["keys"].split())) for _ in range(rounds)]
         whole = statistics.mean(pair[0][0] for pair in pairs)
         measured = interval([two[0] - one[0] for one, two in pairs])
         foretold = [replay["forecast"][key] for key in ("mean", "low", "high")]
         answer = best["name"] if replay["pays"] else f"don't; best: {best['name']}"
-        print(f"| {name} | {answer} | {percent(foretold, whole)} | {percent(measured, whole)} "
+        print(f"| {name} | {answer} | {percent(foretold, statistics.mean(around))} | {percent(measured, whole)} "
               f"| {replay['heap']['bytes'] // 1024}, {best['bytes'] // 1024} "
               f"| {pairs[-1][0][1]}, {pairs[-1][1][1]} |", flush=True)
     return 0
