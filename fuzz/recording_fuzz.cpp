@@ -40,7 +40,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   };
   try {
     Recording recording("fuzz", source);
-    std::uint64_t blocks = 0, time = 0;
+    std::uint64_t blocks = 0;
+    std::uint64_t time = 0;
     for (RecordedEvent event; recording.Next(event); time = event.time) {
       if (event.IsRequest()) ++blocks;
       if (event.block > blocks || event.old > blocks || event.time < time ||

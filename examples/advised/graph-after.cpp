@@ -41,7 +41,8 @@ private:
 } // namespace
 
 int main() {
-  constexpr std::uint32_t nodes = 1000, edges = 1000000;
+  constexpr std::uint32_t nodes = 1000;
+  constexpr std::uint32_t edges = 1000000;
   const long before = ResidentKiB();
   double sum = 0;
   for (int round = 0; round < 5; ++round) {

@@ -11,7 +11,8 @@
 #include <random>
 
 int main(int argc, char** argv) {
-  constexpr std::size_t waiting = 100, messages = 3000000;
+  constexpr std::size_t waiting = 100;
+  constexpr std::size_t messages = 3000000;
   const unsigned long sizes = argc > 1 ? std::strtoul(argv[1], nullptr, 10) : 1000;
   const long before = ResidentKiB();
   VOK::MemPool::Mgr pool("messages", VOK::MemPool::Options().On());

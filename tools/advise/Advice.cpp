@@ -63,6 +63,7 @@ std::vector<Variant> ChangesOf(const Variant& base) {
 
 std::vector<Outcome> OutcomesOf(const std::vector<Variant>& variants) {
   std::vector<Outcome> outcomes;
+  outcomes.reserve(variants.size());
   for (const Variant& variant : variants)
     outcomes.push_back({variant, DifferenceOf(variant, variants.front())});
   return outcomes;
@@ -158,7 +159,8 @@ std::uint64_t Advice::ChooseGrouping(const std::string& operations) {
     tried.push_back(&*std::ranges::find(sites, site, &SiteAdvice::site));
   }
   Measure(operations, variants, request.rounds);
-  std::uint64_t all = 0, chosen = 0;
+  std::uint64_t all = 0;
+  std::uint64_t chosen = 0;
   for (std::size_t i = 0; i < tried.size(); ++i) {
     const Variant& variant = variants[i + 1];
     tried[i]->seconds = DifferenceOf(variant, variants.front());
@@ -174,7 +176,8 @@ std::uint64_t Advice::ChooseGrouping(const std::string& operations) {
 /// Pools as set. Larger requests of the sites than they serve would be blocks of their own.
 Variant Advice::PlainPools(std::uint64_t pooled) const {
   Variant plain{.name = "pools", .pooled = pooled};
-  constexpr std::uint64_t defaultRecord = 996, alignment = 4;
+  constexpr std::uint64_t defaultRecord = 996;
+  constexpr std::uint64_t alignment = 4;
   for (const SiteAdvice& one : sites)
     if (const std::uint64_t size = statistics.sites[one.site].maxSize;
         one.isChosen && size + 8 > defaultRecord && size < 8000)

@@ -125,7 +125,7 @@ void Measure(const std::string& operations, std::vector<Variant>& variants, unsi
 
 std::string ReportOf(const std::string& operations, const Variant& variant, bool detailed) {
   std::vector<std::string> arguments = ArgumentsOf(variant, operations);
-  arguments.push_back(detailed ? "DbgDetailed" : "Dbg");
+  arguments.emplace_back(detailed ? "DbgDetailed" : "Dbg");
   return RunProgram(FindHelper("vokmempool-replay"), arguments, EnvironmentOf(variant));
 }
 

@@ -80,7 +80,7 @@ private:
 
   void Take(const RecordedEvent& event);
   void Add(const RecordedEvent& event);
-  void Remove(std::uint64_t block, std::uint32_t thread);
+  void Remove(std::uint64_t number, std::uint32_t thread);
   std::uint32_t SiteOf(std::uint32_t stack);
   void KeepPeak();
   void AddSample();

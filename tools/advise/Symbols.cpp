@@ -58,7 +58,7 @@ std::string CallFileOf(Dwarf_Die* unit, Dwarf_Die* call) {
 std::string Location::GetName() const {
   constexpr std::string_view unnamed = "(anonymous namespace)::";
   std::string text = function;
-  for (std::size_t at = 0; (at = text.find(unnamed)) != text.npos;)
+  for (std::size_t at = 0; (at = text.find(unnamed)) != std::string::npos;)
     text.erase(at, unnamed.size());
   if (text.starts_with("operator")) return text;
   text.erase(std::min(text.find_first_of("<(["), text.size()));

@@ -40,7 +40,7 @@ public:
 
 private:
   struct Closer {
-    void operator()(Dwfl* dwfl) const;
+    void operator()(Dwfl* open) const;
   };
 
   void Open(std::size_t list);

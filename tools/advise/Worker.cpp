@@ -41,7 +41,8 @@ struct Figures {
 
 /// A program writes what it allocates: each line of a small block, each page of a large one.
 void Touch(const Block& block) {
-  constexpr std::uint32_t line = 64, page = 4096;
+  constexpr std::uint32_t line = 64;
+  constexpr std::uint32_t page = 4096;
   auto* const bytes = static_cast<volatile char*>(block.data);
   for (std::uint32_t i = 0; i < block.size; i += i < page ? line : page)
     bytes[i] = 1;
@@ -172,7 +173,7 @@ private:
     case Action::Resize:
       return Resize(group, block, operation.size);
     case Action::Reset:
-      group->pool.Reset();
+      if (group != nullptr) group->pool.Reset();
       return;
     }
   }

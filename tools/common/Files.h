@@ -24,8 +24,8 @@ public:
   /// Fails if it can't be opened.
   explicit Input(const std::string& path);
 
-  /// Reads up to `size` bytes, fewer only at the end. Fails if that can't be done.
-  std::size_t Read(char* to, std::size_t size);
+  /// Reads up to `count` bytes, fewer only at the end. Fails if that can't be done.
+  std::size_t Read(char* to, std::size_t count);
 
   std::string ReadAll();
 
@@ -34,7 +34,7 @@ public:
 
 private:
   struct Closer {
-    void operator()(std::FILE* file) const;
+    void operator()(std::FILE* open) const;
   };
 
   std::string name;

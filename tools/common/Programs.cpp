@@ -13,8 +13,6 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-extern char** environ;
-
 namespace VOK::MemPool::Tools {
 
 namespace fs = std::filesystem;
@@ -55,6 +53,7 @@ std::vector<std::string> Environment(std::string_view without) {
 
 std::vector<char*> Pointers(std::vector<std::string>& texts) {
   std::vector<char*> pointers;
+  pointers.reserve(texts.size() + 1);
   for (std::string& text : texts)
     pointers.push_back(text.data());
   pointers.push_back(nullptr);

@@ -51,7 +51,8 @@ std::uint64_t GetTime() {
 Ring* Open() {
   timespec now{};
   clock_gettime(CLOCK_MONOTONIC, &now);
-  char path[sizeof folder + 80], ready[sizeof path + 8];
+  char path[sizeof folder + 80];
+  char ready[sizeof path + 8];
   std::snprintf(path, sizeof path, "%s/%d.%010lld%09ld", folder, getpid(),
                 static_cast<long long>(now.tv_sec), now.tv_nsec);
   std::snprintf(ready, sizeof ready, "%s%s", path, ringSuffix);
@@ -129,7 +130,7 @@ void Channel::Prepare() {
   int process = 0;
   if (std::sscanf(setting, "%u %d", &wanted, &process) != 2) return;
   recorder = process;
-  std::strcpy(folder, where);
+  std::memcpy(folder, where, std::strlen(where) + 1);
   depth = std::min(wanted, maxDepth);
 }
 

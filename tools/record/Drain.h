@@ -14,8 +14,8 @@ namespace VOK::MemPool::Tools {
 
 class Drain {
 public:
-  /// Maps the ring in a file, which it then removes. Fails if `recording` can't be made.
-  Drain(const std::string& ring, const std::string& recording, unsigned depth);
+  /// Maps the ring in the file `path`, which it then removes. Fails if `recording` can't be made.
+  Drain(const std::string& path, const std::string& recording, unsigned depth);
 
   int GetProcess() const { return process; }
   const std::string& GetPath() const { return writer.GetPath(); }
@@ -36,7 +36,7 @@ private:
     bool IsUsed() const { return block != 0; }
   };
   struct Unmap {
-    void operator()(Record::Ring* ring) const;
+    void operator()(Record::Ring* mapped) const;
   };
 
   const Record::Slot* Published(std::uint64_t position) const;

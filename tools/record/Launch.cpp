@@ -27,7 +27,7 @@ namespace {
 namespace fs = std::filesystem;
 
 std::string SearchPath(const std::string& command) {
-  if (command.find('/') != command.npos) return command;
+  if (command.find('/') != std::string::npos) return command;
   const char* const variable = std::getenv("PATH");
   std::string_view rest = variable != nullptr ? variable : "/usr/bin:/bin";
   while (!rest.empty()) {
@@ -90,7 +90,7 @@ void PassOn(int signal) { kill(launched, signal); }
 } // namespace
 
 std::string FindProgram(const std::string& command) {
-  const std::string path = SearchPath(command);
+  std::string path = SearchPath(command);
   CheckPreload(path);
   return path;
 }

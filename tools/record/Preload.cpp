@@ -114,6 +114,7 @@ void** FrameOf(void* address) { return static_cast<void**>(address); }
 
 } // namespace
 
+// NOLINTBEGIN(readability-inconsistent-declaration-parameter-name): glibc's names are reserved
 #define VOK_FRAME FrameOf(__builtin_frame_address(0))
 
 VOK_INTERPOSE void* malloc(std::size_t size) {
@@ -210,6 +211,7 @@ VOK_INTERPOSE int dlclose(void* handle) {
   Stack::Forget();
   return error;
 }
+// NOLINTEND(readability-inconsistent-declaration-parameter-name)
 
 namespace {
 
