@@ -100,7 +100,7 @@ def test_states(processes):
 
 def test_moving():
     """A process at work: nothing is damaged, something moves, and it goes on."""
-    child = Child("set on=1;pool a;" + "build 20000;clear;" * 250)
+    child = Child("set on=1;pool a;" + "build 2000;clear;" * 7000)
     found = ""
     while child.process.poll() is None:
         for option in (), ("--stop",):
