@@ -3,7 +3,7 @@
 
 usage: process_test.py FOLDER TABLE... [-- LAUNCHER...]
 
-FOLDER has the programs. TABLE is the name of a file in tests/process; calls.txt explains the form.
+FOLDER has the programs. TABLE is a pattern of files here; process/environment.txt explains the form.
 LAUNCHER starts a program where it doesn't start by itself.
 """
 import os
@@ -52,11 +52,16 @@ ABORTED = (128 + 6, 3, 0x20474343)
 
 
 def calls_in(text):
-    """The calls, each with its outcome and its paragraph."""
+    """The calls, each with its outcome, line by line, and its paragraph."""
     for paragraph in text.split("\n\n"):
+        paragraph = re.sub("(?m)^#.*\n?", "", paragraph)
+        # A transcript's operations follow one another, and so do their lines.
+        if transcript := re.fullmatch("(.*:)\n((?:.+\n?)*)", paragraph):
+            operations, lines = zip(*((*line.split("-> "), "")[:2] for line in transcript[2].splitlines()))
+            paragraph = f"{transcript[1]} {';'.join(operations)} -> {'; '.join(filter(None, lines))}"
         for line in re.sub("\n +", " ", paragraph).splitlines():
             turns, _, rest = line.replace("ON=*", "ON=0|ON=1").partition(" ")
-            for turn in turns.split("|") if turns.strip("#") else ():
+            for turn in turns.split("|"):
                 yield *f"{turn} {rest}".split(" -> "), paragraph
 
 
@@ -98,11 +103,12 @@ def lines_of(text, statements):
 def main():
     words = " ".join(sys.argv[2:]).partition(" --")
     tables, launcher = words[0].split(), words[2].split()
-    source = Path(__file__).parent / "process"
-    calls = [call for table in tables for call in calls_in((source / f"{table}.txt").read_text())]
+    source = Path(__file__).parent
+    files = [file for table in tables for file in sorted(source.glob(f"{table}.txt"))]
+    calls = [call for file in files for call in calls_in(file.read_text())]
     statements = defaultdict(first_sights)
     failures = []
-    results = run([call[0] for call in calls], Path(sys.argv[1]) / f"process_{tables[0]}", launcher)
+    results = run([call[0] for call in calls], Path(sys.argv[1]) / f"process_{Path(tables[0]).name}", launcher)
     for (call, expected, paragraph), (out, err, status) in zip(calls, results):
         expected, *patterns = expected.split("~ ")
         numbers = statements[paragraph]
@@ -112,8 +118,11 @@ def main():
         if int(status):
             lines.append("aborted" if int(status) in ABORTED else f"status {int(status)}")
         found = "; ".join(lines)
-        if found != expected.strip():
-            failures.append(f"{call}\n-> {found}\nnot {expected}\n{err if patterns else ''}")
+        expected = expected.strip()
+        if found != expected:
+            same = len(os.path.commonprefix([found, expected]))
+            failures.append(f"{call}\n-> {found[:same]}\nthen {found[same:]}\nnot {expected[same:]}\n"
+                            f"{err if patterns else ''}")
     sys.exit("\n".join(failures) or None)
 
 

@@ -73,6 +73,11 @@ void Build(State& s) {
 // The compiler must not drop a write that nothing reads.
 void Write(State& s) { static_cast<volatile char*>(s.blocks.back())[std::stol(s.operand)] = 2; }
 
+// Which request had the last block's address first.
+void Where(State& s) {
+  std::cout << std::ranges::find(s.blocks, s.blocks.back()) - s.blocks.begin() << '\n';
+}
+
 // Where the pool of that name is in the list of this program; null is a name, too.
 void Find(State& s) {
   const char* const name = s.operand.empty() ? nullptr : s.operand.c_str();
@@ -122,6 +127,7 @@ constexpr struct {
     {"free", [](State& s) { std::cout << (s.Pool().Free(s.Block()) ? "freed\n" : "refused\n"); }},
     {"size", [](State& s) { std::cout << s.Pool().GetSize(s.Block()) << '\n'; }},
     {"contains", [](State& s) { std::cout << s.Pool().Contains(s.Block()) << '\n'; }},
+    {"where", Where},
     {"write", Write},
     {"forget", [](State& s) { s.blocks.back() = nullptr; }},
     {"names", ShowNames},
