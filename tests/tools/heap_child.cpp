@@ -4,6 +4,7 @@
 #include <sys/wait.h>
 #include <thread>
 #include <unistd.h>
+#include <vector>
 
 namespace {
 
@@ -45,11 +46,11 @@ void Calls() {
 
 /// Each thread's blocks are freed by the main one.
 void Threads() {
-  std::thread threads[numThreads];
-  for (int i = 0; i < numThreads; ++i)
-    threads[i] = std::thread([own = blocks[i]] {
-      for (int k = 0; k < numBlocks; ++k)
-        own[k] = std::malloc(40);
+  std::vector<std::thread> threads;
+  for (auto& own : blocks)
+    threads.emplace_back([&own] {
+      for (void*& block : own)
+        block = std::malloc(40);
     });
   for (std::thread& thread : threads)
     thread.join();
