@@ -166,6 +166,8 @@ TEST_F(Pools, IsValidFindsEachDamage) {
   damage(pool.groups[1], {&group});
   damage(pool.enabled, {false});
   damage(last.prev, {nullptr});
+  damage(BudgetOf(pool).buckets, {2, 4});
+  damage(BudgetOf(pool).held, {0});
   group.numFreeBuckets = 1;
   damage(empty.next2, {nullptr});
   group.numFreeBuckets = 2;

@@ -4,6 +4,7 @@
 
 #include "engine/Bucket.h"
 #include "engine/BucketMgr.h"
+#include "engine/Budget.h"
 #include "engine/ExtRec.h"
 #include "engine/Group.h"
 #include "services/Observers.h"
@@ -42,13 +43,15 @@ bool UsedRecsAreValid(const Bucket& bucket) {
   return areUsed && used == bucket.TotalRecs() - bucket.freeRecs;
 }
 
-bool ExtRecsAreValid(const BucketMgr& pool) {
+// Adds the bytes of their blocks to `held`.
+bool ExtRecsAreValid(const BucketMgr& pool, std::uint64_t& held) {
   std::uint32_t count = 0;
   const ExtRec* prev = nullptr;
   for (const ExtRec* e = pool.extRecs; e != nullptr; prev = e, e = e->next) {
     if (e->prev != prev || e->tag0 != 0xAA || e->tag1 != 0xBB || e->type != RecType::Ext ||
         e->tag3 != 0xCC || ++count > pool.numExtRecs)
       return false;
+    held += sizeof(ExtRec) + std::uint64_t{e->length};
   }
   return count == pool.numExtRecs;
 }
@@ -92,11 +95,17 @@ bool IsValid(const BucketMgr& pool) {
       pool.numGroups != (pool.maxRecSize - pool.minRecSize) / pool.dataAlignment + 1)
     return false;
   bool groupsAreValid = true;
+  std::uint64_t buckets = 0;
+  std::uint64_t held = 0;
   ForEachGroup(pool, [&](const Group& group, std::uint32_t i) {
     groupsAreValid = groupsAreValid && pool.enabled && group.owner == &pool && IsValid(group) &&
                      RecSizeIndex(group.dataSize, pool.minRecSize, pool.dataAlignment) == i;
+    buckets += group.numBuckets;
+    held += group.numBuckets * group.BlockSize();
   });
-  return groupsAreValid && ExtRecsAreValid(pool) && (pool.enabled || pool.extRecs == nullptr);
+  return groupsAreValid && ExtRecsAreValid(pool, held) &&
+         (pool.enabled || pool.extRecs == nullptr) && BudgetOf(pool).buckets == buckets &&
+         BudgetOf(pool).held == held;
 }
 
 } // namespace VOK::MemPool
