@@ -83,14 +83,15 @@ TEST(Limit, HoldsAtEachSize) {
 TEST(Limit, AsksTheProgramForRoom) {
   struct Plan {
     void (*act)(Mgr& pool, const std::vector<void*>& held);
-    bool servesSmall, servesLarge;
+    bool serves[3]; // in the order of sizes
   };
+  constexpr unsigned sizes[] = {4, 100, bucket + 100}; // the last one takes all of the limit
   constexpr Plan plans[] = {
-      {[](Mgr& pool, auto&) { pool.Clear(); }, true, true},
-      {[](Mgr& pool, auto&) { EXPECT_TRUE(pool.Reset()); }, true, true},
-      {[](Mgr& pool, auto& held) { EXPECT_TRUE(pool.Free(held[2])); }, true, false},
-      {[](Mgr& pool, auto& held) { EXPECT_TRUE(pool.Free(held[4])); }, true, true},
-      {[](Mgr&, auto&) {}, false, false}};
+      {[](Mgr& pool, auto&) { pool.Clear(); }, {true, true, true}},
+      {[](Mgr& pool, auto&) { EXPECT_TRUE(pool.Reset()); }, {true, true, false}},
+      {[](Mgr& pool, auto& held) { EXPECT_TRUE(pool.Free(held[2])); }, {true, false, false}},
+      {[](Mgr& pool, auto& held) { EXPECT_TRUE(pool.Free(held[4])); }, {true, true, false}},
+      {[](Mgr&, auto&) {}, {false, false, false}}};
   struct Asked {
     const Plan& plan;
     std::vector<void*> held;
@@ -105,18 +106,18 @@ TEST(Limit, AsksTheProgramForRoom) {
     return true;
   };
   for (const Plan& plan : plans)
-    for (const unsigned size : {4U, 100U}) {
+    for (const std::size_t i : {0U, 1U, 2U}) {
       Asked asked{plan, {}, 0, 0};
       Mgr pool("asking", Options(small).Limit(bucket + large).AtLimit(atLimit, &asked));
       asked.held = {pool.Alloc(4), pool.Alloc(4), pool.Alloc(4), pool.Alloc(4), pool.Alloc(100)};
       EXPECT_THROW(pool.Alloc(bucket + large), std::bad_alloc);
       EXPECT_EQ(asked.times, 0U) << "no answer makes room for this";
-      if (size == 4 ? plan.servesSmall : plan.servesLarge)
-        std::memset(pool.Alloc(size), 1, size);
+      if (plan.serves[i])
+        std::memset(pool.Alloc(sizes[i]), 1, sizes[i]);
       else
-        EXPECT_THROW(pool.Alloc(size), std::bad_alloc);
-      EXPECT_EQ(asked.bytes, size == 4 ? bucket : large);
-      EXPECT_EQ(asked.times, (size == 4 ? plan.servesSmall : plan.servesLarge) ? 1U : 2U);
+        EXPECT_THROW(pool.Alloc(sizes[i]), std::bad_alloc);
+      EXPECT_EQ(asked.bytes, i == 0 ? bucket : large + sizes[i] - 100);
+      EXPECT_EQ(asked.times, plan.serves[i] ? 1U : 2U);
     }
 }
 

@@ -47,4 +47,18 @@ TEST_F(Pools, NewHandlerMayUseThePoolThatIsOutOfMemory) {
   EXPECT_GE(numRuns, 36);
 }
 
+// What a new-handler allocates counts beside the block that the heap refused.
+TEST_F(Pools, NewHandlerCantPassTheLimit) {
+  for (const unsigned size : {4u, 3000u}) {
+    pools.push_back(std::make_unique<Mgr>("limited", Options().On().BucketSize(3000).Limit(5000)));
+    handler = [&] { EXPECT_THROW(Alloc(*pools.back(), size == 4 ? 3000 : 4), std::bad_alloc); };
+    std::set_new_handler([] { handler(); });
+    heap.FailAt(size == 4 ? 2 : 1); // after the Group
+    Alloc(*pools.back(), size);
+    heap.FailAt(0);
+    std::set_new_handler(nullptr);
+    pools.clear();
+  }
+}
+
 } // namespace

@@ -72,8 +72,7 @@ void* Checks::Alloc(std::uint32_t size) {
     auto place = records.insert(std::move(recordNode));
     if (!place.inserted) spareRecord = std::move(place.node);
     Record& record = place.position->second;
-    record.home = home;
-    record.state = State::Free;
+    record.home = home; // an entry is Free as it comes
     if (home != nullptr && !DataIsSound(*place.position)) {
       record.state = State::Retired;
       Report(Finding::Kind::WriteAfterFree, p, &record);
