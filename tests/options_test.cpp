@@ -51,8 +51,18 @@ TEST(Options, ShapeOnePoolAlone) {
   expect("own", {}, "'own'");
   expect("new", Options().BucketSize(1003), "(1000 + 4 > 1003)");
   expect("new", Options().On().MinRecordSize(1001), "(1008 > 1000)");
+  expect("new", Options().DataAlignment(65535), "(65535 > 0)");
   expect("new", Options().DataAlignment(65536), "(65536 > 65535)");
   expect("new", Options().On(false).Limit(1), "a limit needs pooling on");
+  for (const Options& just : {Options().BucketSize(1004), Options().MinRecordSize(1000),
+                              Options().MinRecordSize(13).MaxRecordSize(13).DataAlignment(0)})
+    EXPECT_NO_THROW(Mgr("just", just));
+
+  Output output; // a name in use is refused before anything is constructed
+  Set("trace=1");
+  expect("own", {}, "'own'");
+  Set("trace=0");
+  EXPECT_EQ(output.Text(), "");
 }
 
 // A bucket's block of 4 records of 8 bytes, and a large one.
