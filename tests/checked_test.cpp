@@ -3,6 +3,7 @@
 #include "support/Process.h"
 
 #include "engine/BucketMgr.h"
+#include "engine/ExtRec.h"
 #include "engine/Invariants.h"
 
 #include <gtest/gtest.h>
@@ -172,6 +173,17 @@ TEST(Checked, FindsAndMendsDamagedHeaders) {
         f.pool->Clear();
         EXPECT_EQ(f.pool->GetNumFindings(), 1U) << f.Lines();
       }
+}
+
+TEST(Checked, FindsALinkThatSkipsALargeBlock) {
+  Fixture f;
+  Byte* all[3];
+  for (Byte*& p : all)
+    p = f.Alloc(100);
+  ExtRec::FromData(all[2])->next = ExtRec::FromData(all[0]);
+  EXPECT_TRUE(f.pool->Free(all[2]) && f.IsSound());
+  EXPECT_EQ(f.Lines(), Line("damaged header of ", all[2], ", a record of 100 bytes, request 3"));
+  f.pool->Clear();
 }
 
 TEST(Checked, ServesNoRecordByABrokenFreeList) {
