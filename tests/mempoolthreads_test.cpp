@@ -99,6 +99,12 @@ TEST(ThreadPools, ExchangeBlocks) {
   EXPECT_EQ(GetNumMgrs(), 0U);
 }
 
+TEST(ThreadPools, CostsWhatIsDocumented) {
+  ThreadPools pools("cost", Options().On());
+  const Block block(pools, 40, 8);
+  EXPECT_EQ(GetMgr("cost#1")->GetStats().payload, sizeof(void*) == 8 ? 44U : 48U);
+}
+
 TEST(ThreadPools, ServeEverySizeAndAlignment) {
   for (const bool on : {true, false}) {
     ThreadPools pools("sizes", Options().On(on));

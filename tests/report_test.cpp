@@ -123,7 +123,11 @@ TEST_F(Reports, PoolInDetail) {
   pool.Free(Alloc(pool, 2, 117)[0]);
   Alloc(pool, 2, 1501);
   ExtRec::FromData(Alloc(pool, 121))->length = 12345678;
-  ExpectGolden("detailed", Report([&] { pool.DbgDetailed(); }));
+  const std::string report = Report([&] { pool.DbgDetailed(); });
+  ExpectGolden("detailed", report);
+  std::ostringstream stream;
+  pool.DbgDetailed(stream);
+  EXPECT_EQ(stream.str(), report);
 
   // A report to a dead stream ends as any other. An exception comes through and nothing is left.
   std::ostream nowhere(nullptr);
