@@ -1,10 +1,10 @@
 // A program on the general heap, for the recorder: each function makes requests of its own.
+#include <algorithm>
 #include <cstdlib>
 #include <cstring>
 #include <sys/wait.h>
 #include <thread>
 #include <unistd.h>
-#include <vector>
 
 namespace {
 
@@ -46,12 +46,13 @@ void Calls() {
 
 /// Each thread's blocks are freed by the main one.
 void Threads() {
-  std::vector<std::thread> threads;
-  for (auto& own : blocks)
-    threads.emplace_back([&own] {
+  std::thread threads[numThreads];
+  std::ranges::transform(blocks, threads, [](auto& own) {
+    return std::thread([&own] {
       for (void*& block : own)
         block = std::malloc(40);
     });
+  });
   for (std::thread& thread : threads)
     thread.join();
   for (auto& own : blocks)
