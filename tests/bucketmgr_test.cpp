@@ -15,6 +15,8 @@
 
 namespace {
 
+using namespace VOK::MemPool;
+
 TEST_F(Pools, DamagedHeaders) {
   Mgr& pool = Make("a", "bucket=50 max=16");
   std::uint8_t* const p = Alloc(pool, 12);

@@ -15,6 +15,8 @@
 
 namespace {
 
+using namespace VOK::MemPool;
+
 TEST(OutputLine, HasTheTextOfInsertions) {
   std::mt19937_64 random;
   for (const char* const sizes : {"", "\1", "\3\2", "\2\377", "\3"})

@@ -5,6 +5,8 @@
 
 namespace {
 
+using namespace VOK::MemPool;
+
 // What a new-handler does, one step after the other: a call on the whole pool, or a request of
 // that many bytes. Each plan leaves Groups and buckets other than those that Alloc saw.
 enum Step { reset = -3, clear = -2, freeAll = -1 };

@@ -4,6 +4,8 @@
 
 namespace {
 
+using namespace VOK::MemPool;
+
 // A number is never used again: not after its pool is gone, nor where the pool ran out of memory,
 // at whichever of its allocations, and then nothing is left of it.
 TEST_F(Pools, AutomaticNames) {

@@ -18,6 +18,8 @@ using testing::HasSubstr;
 
 namespace {
 
+using namespace VOK::MemPool;
+
 class Reports : public Pools {
 protected:
   Output output;

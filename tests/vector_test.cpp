@@ -2,6 +2,8 @@
 
 namespace {
 
+using namespace VOK::MemPool;
+
 using Vector = VOK::vector<std::uint32_t>;
 
 static_assert(offsetof(Vector, elems) == 0 && offsetof(Vector, count) == sizeof(void*) &&

@@ -10,13 +10,13 @@
 
 #include <gmock/gmock.h>
 
-using namespace VOK::MemPool;
-
 class Pools : public testing::Test {
 protected:
+  using Mgr = VOK::MemPool::Mgr;
+
   ArenaHeap heap;
   const KeepSettings settings{};
-  const Observers::Quiet looking; // into headers and free records
+  const VOK::MemPool::Observers::Quiet looking; // into headers and free records
   std::vector<std::unique_ptr<Mgr>> pools;
 
   ~Pools() override {
