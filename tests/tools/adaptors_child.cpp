@@ -5,8 +5,9 @@
 
 using namespace VOK::MemPool;
 
+struct alignas(64) Marked {};
+
 int main() {
-  struct alignas(64) Marked {};
   Mgr words("words");
   [[maybe_unused]] const Mgr& reference = words;
   [[maybe_unused]] const Allocator<int> allocator(words);

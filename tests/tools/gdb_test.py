@@ -101,7 +101,7 @@ def test_damage(reports, pid):
 
 def test_values():
     output, _ = debug(sys.argv[3], commands=["run", "info locals"])
-    words = "Mgr", "Mgr", "Allocator<int>", "Resource", "Deleter<main()::Marked>", "Deleter<int []>"
+    words = "Mgr", "Mgr", "Allocator<int>", "Resource", "Deleter<Marked>", "Deleter<int []>"
     threads = "ThreadPools", "ThreadAllocator<int>", "ThreadResource"
     same(re.findall(" = (.* of .*)", output),
          [f"{kind} of 'words'" for kind in words] + [f"{kind} of 'threads'" for kind in threads], output)

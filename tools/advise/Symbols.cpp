@@ -53,6 +53,16 @@ std::string CallFileOf(Dwarf_Die* unit, Dwarf_Die* call) {
   return file != nullptr ? file : "";
 }
 
+/// The compilation unit of an address, null without debug information. clang writes no table of the
+/// addresses of its units, so each is asked then.
+Dwarf_Die* UnitAt(Dwfl_Module* module, std::uint64_t address, Dwarf_Addr& bias) {
+  Dwarf_Die* unit = dwfl_module_addrdie(module, address, &bias);
+  if (unit != nullptr) return unit;
+  while ((unit = dwfl_module_nextcu(module, unit, &bias)) != nullptr)
+    if (dwarf_haspc(unit, address - bias) > 0) return unit;
+  return nullptr;
+}
+
 } // namespace
 
 std::string Location::GetName() const {
@@ -112,11 +122,7 @@ const std::vector<Location>& Symbols::ResolveFrame(std::uint64_t returnAddress) 
     last = {.function = "unknown", .file = {}, .offset = returnAddress};
     return all.push_back(last), all;
   }
-  if (Dwfl_Line* const line = dwfl_module_getsrc(module, address)) {
-    const char* const file = dwfl_lineinfo(line, nullptr, &last.line, nullptr, nullptr, nullptr);
-    if (file != nullptr) last.file = file;
-  }
-  AddInlined(module, address, last, all);
+  AddFunctions(module, address, last, all);
   if (last.function.empty()) {
     GElf_Off offset = 0;
     GElf_Sym symbol;
@@ -132,13 +138,16 @@ const std::vector<Location>& Symbols::ResolveFrame(std::uint64_t returnAddress) 
   return all;
 }
 
-/// Adds the functions that were inlined at an address, and the one that they lie in. `last` starts
-/// as the line of the address, and ends as the outermost function, if that is known.
-void Symbols::AddInlined(Dwfl_Module* module, std::uint64_t address, Location& last,
-                         std::vector<Location>& all) const {
+/// Adds the functions that were inlined at an address, and the one that they lie in, with their
+/// lines. `last` ends as the outermost of them, without a function if that isn't known.
+void Symbols::AddFunctions(Dwfl_Module* module, std::uint64_t address, Location& last,
+                           std::vector<Location>& all) const {
   Dwarf_Addr bias = 0;
-  Dwarf_Die* const unit = dwfl_module_addrdie(module, address, &bias);
+  Dwarf_Die* const unit = UnitAt(module, address, bias);
   if (unit == nullptr) return;
+  Dwarf_Line* const line = dwarf_getsrc_die(unit, address - bias);
+  const char* const file = dwarf_linesrc(line, nullptr, nullptr);
+  if (file != nullptr && dwarf_lineno(line, &last.line) == 0) last.file = file;
   Dwarf_Die* scopes = nullptr;
   const int count = dwarf_getscopes(unit, address - bias, &scopes);
   const Owned<Dwarf_Die> owner(scopes, &std::free);

@@ -45,8 +45,8 @@ private:
 
   void Open(std::size_t list);
   const std::vector<Location>& ResolveFrame(std::uint64_t address);
-  void AddInlined(Dwfl_Module* module, std::uint64_t address, Location& last,
-                  std::vector<Location>& all) const;
+  void AddFunctions(Dwfl_Module* module, std::uint64_t address, Location& last,
+                    std::vector<Location>& all) const;
 
   const Recording& recording;
   std::unique_ptr<Dwfl, Closer> dwfl;
