@@ -225,8 +225,10 @@ TEST_F(Reports, DamagedBucket) {
     std::istringstream words(text);
     std::uint16_t value;
     for (std::string place; words >> place >> value;) {
-      const int offset = fields.contains(place) ? fields.at(place) : std::stoi(place);
-      std::memcpy(&bytes[recsBaseOffset] + offset, &value, sizeof value);
+      const bool isField = fields.contains(place);
+      auto* const at = &bytes[recsBaseOffset] + (isField ? fields.at(place) : std::stoi(place));
+      const std::uint8_t lowFirst[] = {std::uint8_t(value), std::uint8_t(value >> 8)};
+      std::memcpy(at, isField ? static_cast<const void*>(&value) : lowFirst, sizeof value);
     }
   };
   const auto report = [&](bool showRecs, bool showFreeList) {

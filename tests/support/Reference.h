@@ -267,10 +267,15 @@ private:
         isFull ? nullptr : Beside(group->withFree, at, -1), Short(end), Short(group->recSize),
         Short(isFull ? 0 : free.back()), Short(free.size()));
     for (std::uint32_t own = 2; own < end; own += group->recSize)
-      Put(at, base + own, Short(own), Byte(1));
+      PutRec(at, own, own, 1);
     std::uint32_t next = 0;
     for (const std::uint32_t offset : free)
-      Put(at, base + offset, Short(std::exchange(next, offset)), Byte(0));
+      PutRec(at, offset, std::exchange(next, offset), 0);
+  }
+
+  // A record's header has its low byte first on every machine.
+  void PutRec(std::uint8_t* at, std::uint32_t own, std::uint32_t offset, int type) {
+    Put(at, base + own, Byte(offset), Byte(offset >> 8), Byte(type));
   }
 
   static std::uint32_t Number(auto n) { return static_cast<std::uint32_t>(n); }
