@@ -17,7 +17,7 @@ int main() {
     auto* const hello = static_cast<char*>(words.Alloc(5));
     auto* const world = static_cast<char*>(words.Alloc(6));
     words.Alloc(7);
-    std::strcpy(world, "world");
+    std::memcpy(world, "world", 6);
     std::memcpy(hello, world, 6); // one more than asked for
     words.Free(hello);
     words.Free(world);

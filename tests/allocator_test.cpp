@@ -195,7 +195,8 @@ TEST(Adaptors, MakeAndDestroy) {
 
 TEST(Adaptors, RefuseWhatWouldEndTheProcess) {
   ForEachSetting([](Mgr& pool) {
-    constexpr std::size_t limit = 1073741823, most = SIZE_MAX;
+    constexpr std::size_t limit = 1073741823;
+    constexpr std::size_t most = SIZE_MAX;
     constexpr std::size_t requests[][2] = {
         {limit + 1, 1}, {limit - 7, 32}, {most, 8}, {most - 7, 64}, {1, most / 2 + 1}};
     for (const auto& [size, alignment] : requests)
@@ -221,7 +222,8 @@ TEST(Adaptors, CompareAndConvertAsTheStandardsDo) {
               !Resource(a).is_equal(*std::pmr::new_delete_resource()));
 
   using A = Allocator<int>;
-  static_assert(!A::is_always_equal::value && !A::propagate_on_container_copy_assignment::value);
+  static_assert(!A::is_always_equal::value);
+  static_assert(!A::propagate_on_container_copy_assignment::value);
   static_assert(A::propagate_on_container_move_assignment::value);
   static_assert(A::propagate_on_container_swap::value);
   using D = Bolt<1, true>;

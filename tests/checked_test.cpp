@@ -287,7 +287,7 @@ TEST(Checked, SaysNothingOfASoundProgram) {
       if (step % 5000 == 4999) {
         std::size_t count = 0;
         ForEachRecord(*f.pool, [&](void* p, unsigned its) {
-          count += its == 0 || *static_cast<Byte*>(p) == its;
+          if (its == 0 || *static_cast<Byte*>(p) == its) ++count;
         });
         EXPECT_TRUE(count == live.size() && f.IsSound());
         step % 2000 == 1999 ? f.pool->Clear() : void(f.pool->Reset());

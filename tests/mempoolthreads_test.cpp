@@ -149,9 +149,9 @@ TEST(ThreadPools, KeepBlocksForTheirOwner) {
   if (IsWatched()) return;
   ThreadPools pools("kept", Options().On());
   const Mgr& pool = *GetMgr("kept#1");
-  std::vector<void*> blocks;
-  for (int i = 0; i < 3000; ++i)
-    blocks.push_back(pools.Alloc(61U + static_cast<unsigned>(i) % 4, 8));
+  std::vector<void*> blocks(3000);
+  unsigned i = 0;
+  std::generate(blocks.begin(), blocks.end(), [&] { return pools.Alloc(61 + i++ % 4, 8); });
   std::for_each(blocks.begin(), blocks.end(), [&](void* p) { pools.Free(p); });
   EXPECT_EQ(pool.GetStats().usedRecords, 512U); // 32 KiB of 64 bytes
   EXPECT_EQ(pools.Alloc(64, 8), blocks[511]);

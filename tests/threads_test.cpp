@@ -58,6 +58,7 @@ void Work(int thread, int numRounds) {
 
 TEST(Threads, MakeAndListPools) {
   std::vector<std::thread> threads;
+  threads.reserve(4);
   for (int thread = 0; thread < 4; ++thread)
     threads.emplace_back(Work, thread, 300);
   for (std::thread& thread : threads)
@@ -79,7 +80,7 @@ TEST(Threads, LeaveNoLockToAForkedChild) {
     if (child == 0) {
       alarm(10);
       Work(1, 1);
-      _exit(testing::Test::HasFailure());
+      _exit(testing::Test::HasFailure() ? 1 : 0);
     }
     int status = -1;
     waitpid(child, &status, 0);

@@ -28,7 +28,7 @@ bool IsFilled(const void* from, std::size_t size, std::uint8_t byte) {
 /// A node that no operation on the map has, the spare one if it is there.
 template <class Map>
 typename Map::node_type TakeNode(typename Map::node_type& spare) {
-  if (!spare.empty()) return std::move(spare);
+  if (!spare.empty()) return std::exchange(spare, {});
   Map made;
   made.try_emplace(nullptr);
   return made.extract(made.begin());

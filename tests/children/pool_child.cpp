@@ -169,6 +169,7 @@ bool Act(const std::string& name, State& state) {
 
 #if defined(__GLIBC__) && !defined(VOK_MEMPOOL_HOST)
 // Replaces the platform's function, to show what is looked up and in which order.
+// NOLINTNEXTLINE(readability-inconsistent-declaration-parameter-name): the platform's is reserved
 char* secure_getenv(const char* key) noexcept {
   if (std::getenv("ZOR_SHOW_KEYS") != nullptr) std::printf("%s\n", key);
   return std::getenv(key);

@@ -66,7 +66,7 @@ public:
   }
   /// What was written since the last call.
   std::string Text() {
-    const std::string written = text;
+    std::string written = text;
     text.clear();
     return written;
   }

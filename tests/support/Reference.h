@@ -166,7 +166,7 @@ public:
     const auto ext = std::ranges::find(exts, p - extHeader);
     return ext == exts.end() ? 0 : static_cast<std::uint32_t>(blocks.at(*ext).size() - extHeader);
   }
-  bool IsFirstExt(std::uint8_t* p) const { return At(exts, 0) == p - extHeader; }
+  bool IsFirstExt(const std::uint8_t* p) const { return At(exts, 0) == p - extHeader; }
 
   /// Brings all fields in the images up to date.
   void Refresh() {

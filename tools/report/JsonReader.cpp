@@ -48,7 +48,7 @@ public:
   }
   void GetLine(const std::string& key, std::string& text) const {
     Get(key, text);
-    if (text.find('\n') != text.npos) Refuse(key, "a text of one line");
+    if (text.find('\n') != std::string::npos) Refuse(key, "a text of one line");
   }
   void Get(const std::string& key, Number& number) const {
     const Json& json = object.at(key);

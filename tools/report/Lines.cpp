@@ -92,7 +92,8 @@ void Fields::TakeText(std::string_view expected) {
 }
 
 char Fields::TakeOneOf(std::string_view characters) {
-  if (AtEnd() || characters.find(line[at]) == characters.npos) Fail("one of " + Quoted(characters));
+  if (AtEnd() || characters.find(line[at]) == std::string_view::npos)
+    Fail("one of " + Quoted(characters));
   return line[at++];
 }
 
@@ -142,7 +143,7 @@ Percent Fields::TakePercent(int width) {
   const auto whole = ToNumber<std::uint64_t>(text.substr(0, point));
   const std::string_view decimals = text.substr(std::min(point + 1, text.size()));
   if (!whole || *whole > maxPercent || decimals.size() != 3 ||
-      decimals.find('.') != decimals.npos) {
+      decimals.find('.') != std::string::npos) {
     at = start;
     Fail(expected);
   }

@@ -88,7 +88,7 @@ std::string Escaped(std::string_view text, std::string_view special, std::string
     if (c == '\n' && escape == "\\")
       escaped += "\\n";
     else
-      escaped.append(special.find(c) == special.npos ? "" : escape) += c;
+      escaped.append(special.find(c) == std::string_view::npos ? "" : escape) += c;
   return escaped;
 }
 
@@ -223,34 +223,44 @@ std::map<std::string, PoolFigures> ByName(const std::vector<Report>& reports) {
   return pools;
 }
 
+std::string SizesOf(const PoolFigures& before, const PoolFigures& now) {
+  std::string text;
+  ForEachPair(before.bySize, now.bySize, [&](Number size, const Figures* was, const Figures* is) {
+    const std::string change =
+        TextOf(was != nullptr ? *was : Figures(), is != nullptr ? *is : Figures());
+    if (!change.empty()) text += fmt::format("  records of {} bytes: {}\n", size, change);
+  });
+  return text;
+}
+
+/// Null for a pool that isn't there; empty if nothing differs.
+std::string PoolDifference(const std::string& name, const PoolFigures* before,
+                           const PoolFigures* now, bool showsRecords) {
+  static const PoolFigures none;
+  const PoolFigures& a = before != nullptr ? *before : none;
+  const PoolFigures& b = now != nullptr ? *now : none;
+  const std::string change = TextOf(a.all, b.all);
+  const std::string parts = SizesOf(a, b) + (showsRecords ? RecordsOf(a, b) : "");
+  const bool stays = before != nullptr && now != nullptr;
+  if (stays && change.empty() && parts.empty()) return {};
+  const char* const what = before == nullptr         ? "came"
+                           : now == nullptr          ? "went"
+                           : b.all.held > a.all.held ? "grew"
+                           : b.all.held < a.all.held ? "shrank"
+                                                     : "changed";
+  return fmt::format("{} {}{}{}\n{}", OneLine(name), what, change.empty() ? "" : ": ", change,
+                     parts);
+}
+
 } // namespace
 
 std::string Difference(const std::vector<Report>& before, const std::vector<Report>& now,
                        bool showsRecords) {
-  static const PoolFigures none;
   std::string text;
-  ForEachPair(
-      ByName(before), ByName(now),
-      [&](const std::string& name, const PoolFigures* old, const PoolFigures* young) {
-        const PoolFigures& a = old != nullptr ? *old : none;
-        const PoolFigures& b = young != nullptr ? *young : none;
-        std::string sizes;
-        ForEachPair(a.bySize, b.bySize, [&](Number size, const Figures* was, const Figures* is) {
-          const std::string change =
-              TextOf(was != nullptr ? *was : Figures(), is != nullptr ? *is : Figures());
-          if (!change.empty()) sizes += fmt::format("  records of {} bytes: {}\n", size, change);
-        });
-        if (showsRecords) sizes += RecordsOf(a, b);
-        const std::string change = TextOf(a.all, b.all);
-        if (old != nullptr && young != nullptr && change.empty() && sizes.empty()) return;
-        const char* const what = old == nullptr            ? "came"
-                                 : young == nullptr        ? "went"
-                                 : b.all.held > a.all.held ? "grew"
-                                 : b.all.held < a.all.held ? "shrank"
-                                                           : "changed";
-        text += fmt::format("{} {}{}{}\n{}", OneLine(name), what, change.empty() ? "" : ": ",
-                            change, sizes);
-      });
+  ForEachPair(ByName(before), ByName(now),
+              [&](const std::string& name, const PoolFigures* old, const PoolFigures* young) {
+                text += PoolDifference(name, old, young, showsRecords);
+              });
   return text;
 }
 

@@ -89,7 +89,9 @@ void WriteWarning(std::string& text, const std::optional<Warning>& warning, char
 
 /// The four lines of a grid row.
 void WriteMapRow(std::string& text, std::span<const Box> boxes, Number label) {
-  std::string types(mapMargin), offsets(mapMargin), numbers(mapMargin);
+  std::string types(mapMargin);
+  std::string offsets(mapMargin);
+  std::string numbers(mapMargin);
   std::string sizes = fmt::format("{:>4} {}", label, wall);
   for (const Box& box : boxes) {
     types += fmt::format("{:<8}{}", fmt::format("{}{}", TypeText(box.type), box.isHead ? " +" : ""),

@@ -66,6 +66,7 @@ std::string TreeAtPeak(const TraceLedger& ledger, const PoolNames& names) {
 std::string MassifText(const std::vector<History::Snapshot>& snapshots, const TraceLedger& ledger,
                        const PoolNames& names, std::string_view source) {
   std::vector<MassifPoint> points;
+  points.reserve(snapshots.size());
   for (const History::Snapshot& snapshot : snapshots)
     points.push_back({snapshot.event, snapshot.bytes});
   const auto isAtOrAfter = [&](const MassifPoint& p) { return p.event >= ledger.peakEvent; };

@@ -69,12 +69,12 @@ void TraceLedger::End(std::uint64_t addr, LineNumber line) {
 /// Only the first ones are looked for in the table.
 void TraceLedger::KeepLeft(const LivePool& at) {
   const std::uint64_t count = at.pool.records + at.pool.uncertainRecords;
-  if (count > 0 && left.items.size() < left.most) {
+  if (count > 0 && left.items.size() < Kept<Live>::most) {
     std::vector<Live> records;
     for (const LiveRecord& record : live.GetPlaces())
       if (record.line != 0 && record.pool == at.key) records.push_back(LiveOf(record, at.pool));
     std::ranges::sort(records, {}, &Live::line);
-    records.resize(std::min(records.size(), left.most - left.items.size()));
+    records.resize(std::min(records.size(), Kept<Live>::most - left.items.size()));
     left.items.insert(left.items.end(), records.begin(), records.end());
   }
   left.count += count;

@@ -68,7 +68,7 @@ LineKind ReadTraceLine(std::string_view line, TraceEvent& event) {
   if (line.ends_with('\r')) line.remove_suffix(1);
   const bool begins = line.starts_with(prefix);
   if (begins && TakeEvent(line.substr(prefix.size()), event)) return LineKind::Event;
-  return begins || line.find(prefix) != line.npos ? LineKind::Mixed : LineKind::Other;
+  return begins || line.find(prefix) != std::string_view::npos ? LineKind::Mixed : LineKind::Other;
 }
 
 } // namespace VOK::MemPool::Tools
