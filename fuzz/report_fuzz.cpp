@@ -23,7 +23,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   if (again.size() != reports.size()) std::abort();
   for (std::size_t i = 0; i < reports.size(); ++i) {
     const std::string text = WriteReport(reports[i]);
-    if (WriteReport(again[i]) != text || (isText && input.find(text) == input.npos)) std::abort();
+    if (WriteReport(again[i]) != text || (isText && input.find(text) == std::string_view::npos))
+      std::abort();
     CheckReport(reports[i]);
   }
   Summarise(reports);

@@ -28,11 +28,12 @@ Series SeriesOfTrace(std::string_view text) {
     ++line;
     const std::size_t end = text.find('\n');
     TraceEvent event;
-    if (end != text.npos && ReadTraceLine(text.substr(0, end), event) == LineKind::Event) {
+    if (end != std::string_view::npos &&
+        ReadTraceLine(text.substr(0, end), event) == LineKind::Event) {
       ledger.Take(line, event);
       history.Sample(line, ledger);
     }
-    text.remove_prefix(end == text.npos ? text.size() : end + 1);
+    text.remove_prefix(end == std::string_view::npos ? text.size() : end + 1);
   }
   return SeriesOf(history.GetSnapshots(line, ledger), {});
 }

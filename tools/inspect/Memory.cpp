@@ -50,8 +50,10 @@ std::vector<Memory::Range> FindModules(int process) {
     std::uint64_t begin = 0;
     std::uint64_t end = 0;
     char dash = 0;
-    std::string access, offset, device, node, file;
-    words >> std::hex >> begin >> dash >> end >> access >> offset >> device >> node >> std::ws;
+    std::string access;
+    std::string unused;
+    std::string file;
+    words >> std::hex >> begin >> dash >> end >> access >> unused >> unused >> unused >> std::ws;
     std::getline(words, file);
     if (!file.starts_with('/') || end < begin || access.size() != 4) continue;
     if (access[2] == 'x')
@@ -77,11 +79,13 @@ std::map<int, std::uint64_t> FindRunnable(int process) {
     std::getline(file, line);
     // After the name, which may hold anything: the state, 10 fields, the times of user and system.
     std::istringstream fields(line.substr(line.rfind(')') + 1));
-    std::string state, other;
+    std::string state;
+    std::string other;
     fields >> state;
     for (int i = 0; i < 10; ++i)
       fields >> other;
-    std::uint64_t user = 0, system = 0;
+    std::uint64_t user = 0;
+    std::uint64_t system = 0;
     if (fields >> user >> system && state == "R")
       times[std::stoi(thread.path().filename())] = user + system;
   }

@@ -32,7 +32,7 @@ std::optional<std::string> ReadText(const Memory& memory, std::uint64_t address)
     const std::size_t before = text.size();
     text.resize(before + size);
     if (!memory.read(address + before, text.data() + before, size)) return std::nullopt;
-    if (const std::size_t end = text.find('\0', before); end != text.npos) {
+    if (const std::size_t end = text.find('\0', before); end != std::string_view::npos) {
       text.resize(end);
       return text;
     }

@@ -167,6 +167,7 @@ std::vector<std::string> ClassesOf(const Row& row) {
     ++figures.buckets;
   }
   std::vector<std::string> rows;
+  rows.reserve(classes.size() + 1);
   for (const auto& [size, figures] : classes)
     rows.push_back(fmt::format(classForm, size, figures.used, figures.free, figures.buckets));
   rows.push_back(fmt::format(classForm, "ext", report.extRecs.rows.size(), "", ""));
@@ -202,9 +203,8 @@ private:
                   ClassesOf(rows[selected]), 0, "Esc back  q quit");
       return;
     }
-    std::vector<std::string> lines;
-    for (const Row& row : rows)
-      lines.push_back(TextOf(row));
+    std::vector<std::string> lines(rows.size());
+    std::ranges::transform(rows, lines.begin(), TextOf);
     screen.Draw(
         TitleOf(rows, options.process), Headings(), lines, selected,
         "Enter size classes  sort by: n name  h held  g growth  r recent  b buckets  q quit");
