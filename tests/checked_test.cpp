@@ -167,9 +167,9 @@ TEST(Checked, FindsAndMendsDamagedHeaders) {
           EXPECT_EQ(lines, Line("damaged header of ", isBucket ? p - 4 - bucketHeader : p,
                                 isBucket ? ", a bucket" : rest));
         EXPECT_TRUE(f.IsSound());
+        EXPECT_TRUE(finder != 0 || size != 8 || f.Alloc(8) != p) << "it serves no more";
         for (Byte* other : all)
           EXPECT_TRUE(finder == 2 || other == all[5] || other == p || f.pool->Free(other));
-        EXPECT_TRUE(finder != 0 || size != 8 || f.Alloc(8) != p) << "it serves no more";
         f.pool->Clear();
         EXPECT_EQ(f.pool->GetNumFindings(), 1U) << f.Lines();
       }
