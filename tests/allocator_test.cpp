@@ -115,7 +115,7 @@ struct Bolt : Base<1>, Base<2>, Pooled<Bolt<N, on>, Parts<on, 1>> {
 };
 template <std::size_t N, bool on>
 struct Screw final : Bolt<1, on> {
-  Part<N> more[2];
+  Part<N> more;
 };
 template <std::size_t N, bool on>
 struct Nut final : Pooled<Nut<N, on>, Parts<on, 2>> {
