@@ -2,6 +2,7 @@
 #include <algorithm>
 #include <cstdlib>
 #include <cstring>
+#include <malloc.h>
 #include <sys/wait.h>
 #include <thread>
 #include <unistd.h>
@@ -69,6 +70,15 @@ void Forks() {
   waitpid(child, nullptr, 0);
 }
 
+/// Ends at its peak, with one request in 40 near the size of a bucket, and one that no standard
+/// allows.
+void Keeps() {
+  kept[0] = memalign(0, 24);
+  for (int i = 0; i < 20000; ++i)
+    kept[0] = std::malloc(i % 40 == 0 ? 3990 : 24);
+  _exit(0);
+}
+
 } // namespace
 
 int main(int argc, char** argv) {
@@ -77,6 +87,8 @@ int main(int argc, char** argv) {
       Calls();
     else if (std::strcmp(argv[i], "threads") == 0)
       Threads();
+    else if (std::strcmp(argv[i], "keep") == 0)
+      Keeps();
     else if (std::strcmp(argv[i], "fork") == 0)
       Forks();
     else if (std::strcmp(argv[i], "exec") == 0)

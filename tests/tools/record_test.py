@@ -102,6 +102,10 @@ def test_advice():
     same("one size, 40 bytes; 100% are freed together, where Reset or Clear serves; "
          "100% are freed by another thread: MemPoolThreads" in text, True, text)
     same(bool(re.search(r"Replayed: events [\d,]+ to [\d,]+, 2 rounds", text)), True, text)
+    run(PROGRAM, "record", "-o", "kept", "--", CHILD, "keep")
+    kept = json.loads(tool("advise", "--rounds", 2, "--json", "kept"))
+    same((kept["threads"], sum(site["bytesAtPeak"] for site in kept["sites"])),
+         (1, 24 + 500 * 3990 + 19500 * 24), "a program that ends at its peak")
 
 
 GAINS = """[...document.querySelectorAll('.gain')].map((row) =>

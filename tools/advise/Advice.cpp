@@ -173,14 +173,15 @@ std::uint64_t Advice::ChooseGrouping(const std::string& operations) {
   return chosen;
 }
 
-/// Pools as set. Larger requests of the sites than they serve would be blocks of their own.
+/// Pools as set, but for larger requests of the sites, which would be blocks of their own: as far
+/// as a bucket has room for such a record.
 Variant Advice::PlainPools(std::uint64_t pooled) const {
   Variant plain{.name = "pools", .pooled = pooled};
   constexpr std::uint64_t defaultRecord = 996;
   constexpr std::uint64_t alignment = 4;
   for (const SiteAdvice& one : sites)
     if (const std::uint64_t size = statistics.sites[one.site].maxSize;
-        one.isChosen && size + 8 > defaultRecord && size < 8000)
+        one.isChosen && size + 8 > defaultRecord && size < 3968)
       plain.settings.maxRecordSize = std::max(
           plain.settings.maxRecordSize, static_cast<unsigned>((size + 8 + alignment) / 4 * 4));
   return plain;

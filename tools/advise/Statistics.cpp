@@ -37,6 +37,7 @@ void Statistics::Read() {
     if (recording.numEvents % interval == 0) AddSample();
   }
   if (recording.numEvents % interval != 0) AddSample();
+  KeepPeak(); // which may be the end
 }
 
 LogCounts Statistics::GetLifetimes() const {

@@ -4,6 +4,7 @@
 #include "advise/Operations.h"
 
 #include <MemPoolAllocator>
+#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -131,7 +132,7 @@ public:
     const std::uint64_t before = ResidentBytes();
     RunTo(header.first);
     std::uint64_t start = GetTime();
-    RunTo(header.peak + 1);
+    RunTo(std::min(header.peak + 1, header.count));
     figures.nanoseconds = GetTime() - start;
     figures.bytes = ResidentBytes() - before;
     start = GetTime();

@@ -10,6 +10,7 @@
 #include <fcntl.h>
 #include <sched.h>
 #include <sys/mman.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 
 namespace VOK::MemPool::Record {
@@ -115,7 +116,7 @@ bool AwaitRoom(Ring& to, std::uint64_t position) {
       return false;
     }
     const timespec time{0, nap};
-    nanosleep(&time, nullptr);
+    syscall(SYS_nanosleep, &time, nullptr); // no cancellation point, as no request is one
   }
   return true;
 }

@@ -58,13 +58,16 @@ std::string InterpreterOf(const std::string& path) {
   return line.substr(begin, line.find_first_of(" \t", begin) - begin);
 }
 
+constexpr int maxInterpreters = 4; // one of the other, as the kernel has it
+
 /// Fails if the loader wouldn't preload a library into the program.
-void CheckPreload(const std::string& path) {
+void CheckPreload(const std::string& path, int level = 0) {
   struct stat state {};
   if (stat(path.c_str(), &state) != 0 || access(path.c_str(), X_OK) != 0)
     throw Failure(fmt::format("{}: can't be run: {}", path, std::strerror(errno)));
   if (const std::string interpreter = InterpreterOf(path); !interpreter.empty())
-    return CheckPreload(interpreter);
+    return level < maxInterpreters ? CheckPreload(interpreter, level + 1)
+                                   : throw Failure(path + ": has too many interpreters");
   if ((state.st_mode & (S_ISUID | S_ISGID)) != 0 ||
       getxattr(path.c_str(), "security.capability", nullptr, 0) > 0)
     throw Failure(
@@ -104,6 +107,7 @@ pid_t Launch(const std::string& program, std::vector<std::string> arguments,
   variables.push_back(fmt::format("{}={}", Record::folderVariable, rings));
   variables.push_back(fmt::format("{}={} {}", Record::settingVariable, depth, getpid()));
 
+  std::signal(SIGCHLD, SIG_DFL); // an inherited SIG_IGN would hide the child's end
   pid_t child = 0;
   const int error = posix_spawn(&child, program.c_str(), nullptr, nullptr,
                                 Pointers(arguments).data(), Pointers(variables).data());

@@ -103,7 +103,7 @@ void PutBlock(void* const* frame, Kind kind, const void* block, std::size_t size
               std::size_t alignment = 1) {
   const int saved = errno;
   Channel::Put({.kind = kind,
-                .alignmentLog = static_cast<std::uint8_t>(std::bit_width(alignment) - 1),
+                .alignmentLog = static_cast<std::uint8_t>(std::bit_width(alignment | 1) - 1),
                 .stack = Stack::GetNumber(frame),
                 .address = reinterpret_cast<std::uintptr_t>(block),
                 .size = size});

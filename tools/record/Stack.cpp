@@ -53,24 +53,32 @@ std::uint64_t HashOf(void* const* frames, unsigned count) {
   return hash | 1; // 0 is a free slot
 }
 
-/// The end of the thread's stack, beyond which no frame lies.
-std::uintptr_t GetStackEnd() {
-  thread_local std::uintptr_t end = 0;
-  if (end == 0) {
-    pthread_attr_t attributes;
-    if (pthread_getattr_np(pthread_self(), &attributes) != 0) return 0;
+struct StackBounds {
+  std::uintptr_t begin = 0, end = 0;
+};
+
+/// The thread's stack; empty if it isn't known.
+const StackBounds& GetStackBounds() {
+  thread_local StackBounds bounds;
+  pthread_attr_t attributes;
+  if (bounds.end == 0 && pthread_getattr_np(pthread_self(), &attributes) == 0) {
     void* low = nullptr;
     std::size_t size = 0;
     pthread_attr_getstack(&attributes, &low, &size);
     pthread_attr_destroy(&attributes);
-    end = reinterpret_cast<std::uintptr_t>(low) + size;
+    bounds.begin = reinterpret_cast<std::uintptr_t>(low);
+    bounds.end = bounds.begin + size;
   }
-  return end;
+  return bounds;
 }
 
-/// Follows the frame pointers as long as they rise within the thread's stack.
+/// Follows the frame pointers as long as they rise within the thread's stack: not at all from the
+/// stack of a coroutine, beyond whose end nothing may be readable.
 unsigned WalkFrames(void* const* frame, void** frames, unsigned depth) {
-  const std::uintptr_t end = GetStackEnd() - 2 * sizeof(void*);
+  const StackBounds& bounds = GetStackBounds();
+  const auto first = reinterpret_cast<std::uintptr_t>(frame);
+  const bool isWithin = bounds.begin <= first && first < bounds.end;
+  const std::uintptr_t end = isWithin ? bounds.end - 2 * sizeof(void*) : 0;
   unsigned count = 0;
   for (;;) {
     if (frame[1] == nullptr) break;
