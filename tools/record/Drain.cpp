@@ -122,10 +122,10 @@ void Drain::PutSlots(std::uint64_t position, const Slot& first, std::uint64_t sl
   const auto kind = static_cast<Kind>(first.address >> kindShift);
   const std::uint64_t address = first.address & addressMask;
   const std::uint64_t size = first.size & sizeMask;
-  if (kind >= Kind::Stack) {
-    const std::uint64_t bytes = kind == Kind::Stack ? size * sizeof(void*) : size;
-    return PutInformation(kind, address, TailOf(position, slots, slots > 1 ? bytes : 0));
-  }
+  if (kind == Kind::Stack)
+    return PutStack(first.stack, TailOf(position, slots, slots > 1 ? size * sizeof(void*) : 0));
+  if (kind > Kind::Stack)
+    return PutInformation(kind, address, TailOf(position, slots, slots > 1 ? size : 0));
 
   const std::uint64_t now = first.time / nanosecondsPerMicrosecond;
   if (now > time) writer.Put(Entry::Time, {now - std::exchange(time, now)});
@@ -155,8 +155,6 @@ void Drain::PutSlots(std::uint64_t position, const Slot& first, std::uint64_t sl
 void Drain::PutInformation(Kind kind, std::uint64_t address, const std::string& tail) {
   const std::string text = tail.substr(0, mostText);
   switch (kind) {
-  case Kind::Stack:
-    return PutStack(tail);
   case Kind::Module:
     return writer.Put(Entry::Module, {address, text.size()}, text);
   case Kind::Unload:
@@ -168,7 +166,10 @@ void Drain::PutInformation(Kind kind, std::uint64_t address, const std::string& 
   }
 }
 
-void Drain::PutStack(const std::string& frames) {
+// Threads number their stacks before they put them, so the numbers come in any order. The file has
+// them by their order in it.
+void Drain::PutStack(std::uint32_t number, const std::string& frames) {
+  stackNumbers[number] = ++numStacks;
   const std::size_t count = frames.size() / sizeof(std::uint64_t);
   writer.Put(Entry::Stack, {count});
   std::uint64_t before = 0;
@@ -190,6 +191,8 @@ void Drain::PutBlock(Kind kind, const Slot& slot) {
   const std::uint64_t address = slot.address & addressMask;
   const std::uint64_t size = slot.size & sizeMask;
   const std::uint64_t alignmentLog = slot.size >> alignmentShift & 0x3f;
+  const auto known = stackNumbers.find(slot.stack);
+  const std::uint64_t stack = known != stackNumbers.end() ? known->second : 0;
   std::uint64_t old = 0;
   if (kind == Kind::Realloc) old = std::exchange(reallocated[slot.size >> threadShift], {}).second;
   if (live.Find(address) != nullptr) { // its release was lost
@@ -198,11 +201,11 @@ void Drain::PutBlock(Kind kind, const Slot& slot) {
   }
   if (kind == Kind::Realloc && old == 0) kind = Kind::Malloc;
   if (kind == Kind::Realloc)
-    PutEvent(EntryOf(kind), {lastBlock - old, size, slot.stack});
+    PutEvent(EntryOf(kind), {lastBlock - old, size, stack});
   else if (kind == Kind::Aligned)
-    PutEvent(EntryOf(kind), {size, slot.stack, alignmentLog});
+    PutEvent(EntryOf(kind), {size, stack, alignmentLog});
   else
-    PutEvent(EntryOf(kind), {size, slot.stack});
+    PutEvent(EntryOf(kind), {size, stack});
   live.FindOrAdd(address).block = ++lastBlock;
 }
 

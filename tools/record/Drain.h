@@ -9,6 +9,7 @@
 #include <map>
 #include <memory>
 #include <string>
+#include <unordered_map>
 
 namespace VOK::MemPool::Tools {
 
@@ -44,7 +45,7 @@ private:
   std::string TailOf(std::uint64_t position, std::uint64_t slots, std::uint64_t size) const;
   void PutSlots(std::uint64_t position, const Record::Slot& first, std::uint64_t slots);
   void PutInformation(Record::Kind kind, std::uint64_t address, const std::string& tail);
-  void PutStack(const std::string& frames);
+  void PutStack(std::uint32_t number, const std::string& frames);
   void PutEvent(Entry entry, std::initializer_list<std::uint64_t> numbers);
   void PutBlock(Record::Kind kind, const Record::Slot& slot);
   void PutFree(std::uint64_t address);
@@ -55,6 +56,8 @@ private:
   RecordingWriter writer;
   AddressTable<Live> live;
   std::map<std::uint64_t, std::pair<std::uint64_t, std::uint64_t>> reallocated;
+  std::unordered_map<std::uint32_t, std::uint32_t> stackNumbers; ///< in the file, by the process's
+  std::uint32_t numStacks = 0;
   std::uint64_t at = 0; ///< the next position
   std::uint64_t lastBlock = 0, time = 0, thread = 0;
   std::uint64_t numEvents = 0, numLost = 0;
