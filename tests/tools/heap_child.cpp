@@ -70,6 +70,13 @@ void Forks() {
   waitpid(child, nullptr, 0);
 }
 
+/// A child's first request comes after the end of its parent.
+void Orphan() {
+  if (fork() != 0) _exit(0);
+  usleep(200'000);
+  Mallocs(10);
+}
+
 /// Ends at its peak, with one request in 40 near the size of a bucket, and one that no standard
 /// allows.
 void Keeps() {
@@ -91,6 +98,8 @@ int main(int argc, char** argv) {
       Keeps();
     else if (std::strcmp(argv[i], "fork") == 0)
       Forks();
+    else if (std::strcmp(argv[i], "orphan") == 0)
+      Orphan();
     else if (std::strcmp(argv[i], "exec") == 0)
       execl(argv[0], argv[0], "calls", nullptr);
     else if (std::strcmp(argv[i], "kill") == 0)

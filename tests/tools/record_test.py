@@ -5,13 +5,17 @@ usage: record_test.py VOKMEMPOOL POOL_CHILD HEAP_CHILD [CHROMIUM]
 """
 import json
 import re
+import shutil
+import signal
+import subprocess
 import sys
 import tempfile
+import time
 from contextlib import chdir
 from pathlib import Path
 
 from browser import Browser
-from support import Work, data_of, run, same, tool, PROGRAM
+from support import Work, data_of, run, same, tool, POOLS, PROGRAM
 
 CHILD = sys.argv[3]
 # By function: requests, their sizes, releases, live at the end.
@@ -24,6 +28,7 @@ RECORDINGS = [
     ("fork calls", 0, [CALLS, {"Mallocs": [10, "24", 10, 0]}]),
     ("exec", 0, [{}, CALLS]),
     ("calls kill", 134, [CALLS]),
+    ("orphan", 0, [{}, {"Mallocs": [10, "24", 10, 0]}]),
 ]
 REFUSALS = [
     (["record", "--", "nosuch"], "nosuch: no such program"),
@@ -37,6 +42,12 @@ REFUSALS = [
     (["advise", "newer"], "newer: a recording of version 2; this program reads version 1"),
     (["advise", "damaged"], re.compile("damaged: after event 0: a damaged block: .*")),
     (["replay", "text"], "text: is neither a recording nor has it a trace line"),
+]
+BAD_ARGUMENTS = [
+    (["record", "-o", "-", "--", "true"],
+     "--output: takes a file; standard output is the program's"),
+    (["replay", "rec", "--min-record-size", 2000, "--max-record-size", 100],
+     "the smallest record is larger than the largest (2000 > 100)"),
 ]
 
 
@@ -92,6 +103,81 @@ def test_refusals():
             message = re.compile(re.escape(message))
         matches = re.fullmatch("vokmempool: " + message.pattern + "\n", errors) is not None
         same((output, status, matches), ("", 1, True), f"{arguments}: {errors}")
+    for arguments, message in BAD_ARGUMENTS:
+        same(run(PROGRAM, *arguments), ("", f"vokmempool: {message}\nusage: vokmempool SUBCOMMAND "
+                                        "[OPTIONS] [FILE]\n", 2), arguments)
+
+
+def test_places():
+    """A recorder that is installed under a path with blanks, a recorder in a recorder, a recording
+    that is read from a pipe, and no memory for a ring."""
+    folder = Path("a folder: own")
+    folder.mkdir()
+    for file in (PROGRAM, Path(PROGRAM).with_name("libvokmempool-record.so")):
+        shutil.copy(file, folder)
+    run(folder / "vokmempool", "record", "--", PROGRAM, "record", "-o", "inner", "--", CHILD, "calls")
+    whole = tool("advise", "--no-replay", "--json", "inner")
+    same(advice("inner")[1]["Mallocs"], CALLS["Mallocs"], "a recorder in a recorder")
+    same("vokmempool record" in tool("advise", "--no-replay", "vokmempool.rec"), True, "the outer one")
+    given = Path("inner").read_bytes().decode("latin-1")
+    same(tool("advise", "--no-replay", "--json", "-", given=given), whole, "standard input")
+    same(run("unshare", "-rm", "sh", "-c", f"mount -t tmpfs -o size=4m none /dev/shm; {PROGRAM} "
+             f"record -- {CHILD} 3 2>&1")[0].split(" in ")[0],
+         "vokmempool: nothing was recorded: the loader ignored the recorder's library, or there was "
+         "no memory for its ring", "no memory")
+
+
+def recording(*entries):
+    """A recording with these entries: the kind of each, its numbers, its bytes behind their length."""
+    def number(value):
+        return bytes([value]) if value < 128 else bytes([value & 127 | 128]) + number(value >> 7)
+    plain = b"".join(number(part) if isinstance(part, int) else number(len(part)) + part
+                     for entry in entries for part in entry)
+    size = len(plain).to_bytes(4, "little")
+    frame = b"\x28\xb5\x2f\xfd\xa0" + size + (len(plain) << 3 | 1).to_bytes(3, "little") + plain
+    return b"VOKMPREC\1\0\0\0" + len(frame).to_bytes(4, "little") + size + frame
+
+
+def test_entries():
+    """A stack between the modules of a list, a block that no pool serves, and a last sample."""
+    unload, malloc, stack, module, end = 5, 16, 6, 4, 0
+    modules = [(CHILD, 1 << 40), (POOLS, 2 << 40)]
+    starts = [int.from_bytes(Path(path).read_bytes()[24:32], "little") + at + 1 for path, at in modules]
+    Path("made").write_bytes(recording(
+        [unload], [module, modules[0][1], CHILD.encode()], [stack, 1, 2 * starts[0]],
+        [module, modules[1][1], POOLS.encode()], [stack, 1, 2 * starts[1]],
+        [malloc, 5 << 30, 1], *[[malloc, 24, 2]] * 796, [end, 797, 0]))
+    found = json.loads(tool("advise", "--rounds", 2, "--json", "made"))
+    same([(site["where"], site["requests"]) for site in found["sites"]], [("_start+0x1", 797)],
+         "the modules")
+    same(found["samples"][-1]["event"], 797, "the last sample")
+    same(found["replay"]["last"], 797, "what was replayed")
+
+
+def test_interrupt():
+    """A recording ends by a signal once the program has ended; the replays end by one, and leave
+    nothing behind."""
+    left = subprocess.Popen([PROGRAM, "record", "-o", "left", "--", "sh", "-c", "(sleep 30 &); exit 3"],
+                            stderr=subprocess.DEVNULL)
+    while not Path("left").exists():
+        time.sleep(.01)
+    for _ in range(20):
+        time.sleep(.3)
+        left.send_signal(signal.SIGINT)
+        if left.poll() is not None:
+            break
+    same(left.returncode, 3, "a recording that a process of the program outlives")
+    def files():
+        return set(Path("/dev/shm").glob("vokmempool.*"))
+    before = files()
+    advise = subprocess.Popen([PROGRAM, "advise", "--rounds", "1000", "--run", "--", CHILD, "keep"],
+                              stderr=subprocess.PIPE)
+    advise.stderr.readline()
+    while files() - before:
+        time.sleep(.01)
+    advise.send_signal(signal.SIGINT)
+    same(advise.wait(10), -signal.SIGINT, "interrupted replays")
+    same(files() - before, set(), "what is left")
 
 
 def test_advice():
@@ -163,6 +249,9 @@ with tempfile.TemporaryDirectory() as folder, chdir(folder):
     test_recordings()
     test_cut()
     test_refusals()
+    test_places()
+    test_entries()
+    test_interrupt()
     test_advice()
     test_replay()
     if len(sys.argv) > 4:

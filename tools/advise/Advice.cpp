@@ -72,7 +72,8 @@ std::vector<Outcome> OutcomesOf(const std::vector<Variant>& variants) {
 } // namespace
 
 Advice::Advice(const AdviceRequest& request_)
-    : request(request_), recording(OpenRecording(request.file)), statistics(recording) {
+    : request(request_), recording(OpenRecording(request.file, request.name)),
+      statistics(recording) {
   statistics.Read();
   JudgeSites();
   if (request.measures) Replay();
@@ -141,7 +142,7 @@ void Advice::WriteOperations(OperationsFile& operations,
   std::vector<std::uint8_t> groupOf(statistics.sites.size());
   for (std::size_t i = 0; i < pooled.size(); ++i)
     groupOf[pooled[i]] = static_cast<std::uint8_t>(i + 1);
-  Recording again = OpenRecording(request.file);
+  Recording again = OpenRecording(request.file, request.name);
   for (RecordedEvent event; again.Next(event);)
     operations.Take(event,
                     event.IsRequest() ? groupOf[statistics.GetSite(event.stack)] : std::uint8_t(0));

@@ -18,7 +18,8 @@
 namespace VOK::MemPool::Tools {
 
 struct AdviceRequest {
-  std::string file;
+  std::string file; ///< is read twice
+  std::string name; ///< of the file, for messages
   unsigned rounds = 10;
   std::uint64_t mostEvents = 20000000; ///< that are replayed
   bool measures = true;                ///< else statistics alone

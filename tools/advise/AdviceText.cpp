@@ -130,10 +130,10 @@ std::string Advice::GetText() const {
     command += (command.empty() ? "" : " ") + argument;
   const Statistics& all = statistics;
   std::string text = fmt::format("{}\n\nProgram    {}\n", GetAnswer(), command);
-  text +=
-      fmt::format("Recording  {} events{}{}\n", Count(recording.numEvents),
-                  recording.numLost > 0 ? fmt::format(", {} lost", Count(recording.numLost)) : "",
-                  recording.isCut ? "; it is cut, and read to its last whole block" : "");
+  text += fmt::format(
+      "Recording  {} events{}{}\n", Count(recording.numEvents),
+      recording.numLost > 0 ? fmt::format(", at least {} lost", Count(recording.numLost)) : "",
+      recording.isCut ? "; it is cut, and read to its last whole block" : "");
   text += fmt::format("Requests   {} of {} bytes, {} of them realloc; {}\n", Count(all.requests),
                       Count(all.bytes), Count(all.reallocs), Counted(all.threads, "thread"));
   text += fmt::format("Peak       {} bytes live, after event {}\n", Count(all.peakBytes),

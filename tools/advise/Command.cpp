@@ -30,21 +30,23 @@ struct Options {
 };
 
 /// Of several processes the one with the largest recording: a driver starts what does the work.
-std::string RecordLargest(const std::string& folder, const std::vector<std::string>& program) {
+HeldFile RecordLargest(const std::vector<std::string>& program) {
   namespace fs = std::filesystem;
-  RecordProgram({.file = folder + "/recording", .isKept = false, .program = program});
-  const std::vector<fs::path> files{fs::directory_iterator(folder), {}};
+  const TemporaryFolder folder;
+  RecordProgram({.file = folder.GetPath() + "/recording", .isKept = false, .program = program});
+  const std::vector<fs::path> files{fs::directory_iterator(folder.GetPath()), {}};
   if (files.size() > 1)
     fmt::print(stderr, "vokmempool: the advice is for the process with the largest recording\n");
-  return *std::ranges::max_element(files, {}, [](const fs::path& file) { return file_size(file); });
+  const auto bytesOf = [](const fs::path& file) { return file_size(file); };
+  return HeldFile(*std::ranges::max_element(files, {}, bytesOf));
 }
 
-/// Once it is there, no file is left of a program that was run.
 Advice MakeAdvice(const Options& options) {
-  const TemporaryFolder folder;
+  const HeldFile file =
+      options.runs ? RecordLargest(options.words) : HeldFile(options.words.front());
   AdviceRequest request = options.request;
-  request.file =
-      options.runs ? RecordLargest(folder.GetPath(), options.words) : options.words.front();
+  request.file = file.GetPath();
+  request.name = NameOfFile(options.words.front());
   request.measures = !options.noReplay;
   return Advice(request);
 }

@@ -45,6 +45,8 @@ static_assert(sizeof(OperationsHeader) == 64);
 
 constexpr unsigned mostGroups = 64; // as bits of a number
 
+constexpr int badSettings = 2; // status of a replay whose settings no pool can have
+
 } // namespace VOK::MemPool::Tools
 
 #endif

@@ -1,15 +1,9 @@
 #include "advise/OperationsFile.h"
 
 #include "common/Files.h"
-#include "common/Programs.h"
-#include "common/Tool.h"
 
+#include <MemPool>
 #include <algorithm>
-#include <cerrno>
-#include <cstdlib>
-#include <cstring>
-#include <fmt/format.h>
-#include <unistd.h>
 
 namespace VOK::MemPool::Tools {
 
@@ -27,22 +21,16 @@ Part Part::Around(std::uint64_t peak, std::uint64_t events, std::uint64_t most) 
   return {first, first + most};
 }
 
-OperationsFile::OperationsFile(const Part& part_, bool isPlain)
-    : part(part_), path(TemporaryName()) {
+OperationsFile::OperationsFile(const Part& part_, bool isPlain) : part(part_) {
   header.aligned = isPlain ? 0 : ~std::uint64_t(0);
-  const int file = mkstemp(path.data());
-  if (file < 0) throw Failure(fmt::format("{}: can't be made: {}", path, std::strerror(errno)));
-  close(file);
 }
-
-OperationsFile::~OperationsFile() { unlink(path.c_str()); }
 
 void OperationsFile::Take(const RecordedEvent& event, std::uint8_t group) {
   if (numEvents == part.first) Start();
   if (numEvents++ >= part.last) return;
   Block* const old = blocks.Find(event.kind == Entry::Realloc ? event.old : event.block);
-  if (!event.IsRequest()) {
-    if (old == nullptr) return; // a block from before the recording
+  if (!event.IsRequest() || event.size > maxRequest) {
+    if (old == nullptr) return; // a block from before the recording, or one that was left out
     PutFree(*old);
     return blocks.Remove(*old);
   }
@@ -82,7 +70,6 @@ void OperationsFile::Start() {
 }
 
 void OperationsFile::Put(const Block& block, Action action) {
-  if (block.size > ~std::uint32_t(0)) throw Failure("a block above 4 GiB can't be replayed");
   Run& run = runs[block.group];
   run.frees.clear();
   if (action != Action::Resize) ++run.live;
@@ -123,7 +110,7 @@ void OperationsFile::Write() {
   std::string text(reinterpret_cast<const char*>(&header), sizeof header);
   text.append(reinterpret_cast<const char*>(operations.data()),
               operations.size() * sizeof(Operation));
-  WriteFile(path, text);
+  WriteFile(GetPath(), text);
 }
 
 } // namespace VOK::MemPool::Tools

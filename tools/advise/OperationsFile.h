@@ -5,6 +5,7 @@
 
 #include "advise/Operations.h"
 #include "common/AddressTable.h"
+#include "common/Programs.h"
 #include "record/Reader.h"
 
 #include <cstdint>
@@ -21,15 +22,13 @@ struct Part {
   static Part Around(std::uint64_t peak, std::uint64_t events, std::uint64_t most);
 };
 
-/// A file in memory, which goes with the object.
+/// A file in memory, which goes with the object. It has no block that a pool would refuse for its
+/// size: what is larger stays with the heap whatever is advised.
 class OperationsFile {
 public:
   /// `isPlain`: the sizes are what a pool was asked for. Else what asks for multiples of 8 bytes
   /// alone is taken for objects with pointers, which an adaptor aligns.
   explicit OperationsFile(const Part& part, bool isPlain = false);
-  ~OperationsFile();
-  OperationsFile(const OperationsFile&) = delete;
-  OperationsFile& operator=(const OperationsFile&) = delete;
 
   /// Takes all events in turn, those before the part too; those after it change nothing. `group` is
   /// that of a request, 0 for the heap. A block keeps the group that it was made in.
@@ -38,7 +37,7 @@ public:
   /// Once all were taken. Fails if the file can't be written.
   void Write();
 
-  const std::string& GetPath() const { return path; }
+  const std::string& GetPath() const { return file.GetPath(); }
 
 private:
   struct Block {
@@ -61,7 +60,7 @@ private:
   std::uint32_t TakeSlot();
 
   const Part part;
-  std::string path;
+  HeldFile file;
   bool isStarted = false;
   std::uint64_t numEvents = 0;
   std::vector<Operation> operations;

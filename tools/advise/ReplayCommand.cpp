@@ -4,6 +4,7 @@
 #include "advise/OperationsFile.h"
 #include "common/Files.h"
 #include "common/Numbers.h"
+#include "common/Programs.h"
 #include "common/Tool.h"
 #include "trace/Ledger.h"
 
@@ -34,8 +35,9 @@ bool IsRecording(const std::string& path) {
 }
 
 /// All requests come from one pool.
-std::uint64_t TakeRecording(const std::string& path, OperationsFile& operations) {
-  Recording recording = OpenRecording(path);
+std::uint64_t TakeRecording(const std::string& path, const std::string& name,
+                            OperationsFile& operations) {
+  Recording recording = OpenRecording(path, name);
   for (RecordedEvent event; recording.Next(event);)
     operations.Take(event, 1);
   return recording.numEvents;
@@ -88,7 +90,8 @@ private:
   std::uint64_t lastBlock = 0, numEvents = 0;
 };
 
-std::uint64_t TakeTrace(const std::string& path, OperationsFile& operations) {
+std::uint64_t TakeTrace(const std::string& path, const std::string& name,
+                        OperationsFile& operations) {
   Input input(path);
   Progress progress(input.GetSize());
   TraceEvents events(operations);
@@ -100,16 +103,17 @@ std::uint64_t TakeTrace(const std::string& path, OperationsFile& operations) {
     return true;
   });
   if (events.GetNumEvents() == 0)
-    throw Failure(
-        fmt::format("{}: is neither a recording nor has it a trace line", NameOfFile(path)));
+    throw Failure(fmt::format("{}: is neither a recording nor has it a trace line", name));
   return events.GetNumEvents();
 }
 
 void Run(const Options& options) {
-  const bool isRecording = IsRecording(options.file);
+  const HeldFile file(options.file);
+  const std::string name = NameOfFile(options.file);
+  const bool isRecording = IsRecording(file.GetPath());
   OperationsFile operations({0, options.reportAt.value_or(~std::uint64_t(0))}, !isRecording);
   const std::uint64_t events =
-      isRecording ? TakeRecording(options.file, operations) : TakeTrace(options.file, operations);
+      (isRecording ? TakeRecording : TakeTrace)(file.GetPath(), name, operations);
   operations.Write();
   std::vector<Variant> variants{{.name = "heap"},
                                 {.name = "pool",
@@ -163,7 +167,14 @@ void AddReplay(CLI::App& app) {
   command->add_flag("--detailed", options->detailed, "each bucket with its records")->needs(at);
   command->footer("Example: what would larger buckets take?\n"
                   "  vokmempool replay --bucket-size 16000 vokmempool.rec");
-  command->callback([options] { Run(*options); });
+  command->callback([options] {
+    try {
+      Run(*options);
+    } catch (const ProgramFailure& failure) {
+      if (failure.status == badSettings) throw CLI::ValidationError(failure.what());
+      throw;
+    }
+  });
 }
 
 } // namespace VOK::MemPool::Tools

@@ -34,7 +34,9 @@ void Statistics::Read() {
   AddSample();
   for (RecordedEvent event; recording.Next(event);) {
     Take(event);
-    if (recording.numEvents % interval == 0) AddSample();
+    if (recording.numEvents % interval != 0) continue;
+    AddSample();
+    ThinSamples();
   }
   if (recording.numEvents % interval != 0) AddSample();
   KeepPeak(); // which may be the end
@@ -169,6 +171,9 @@ void Statistics::AddSample() {
   for (const Site& site : sites)
     sample.liveBytes.push_back(site.liveBytes);
   samples.push_back(std::move(sample));
+}
+
+void Statistics::ThinSamples() {
   if (samples.size() < mostSamples) return;
   interval *= 2;
   std::erase_if(samples, [&](const Sample& one) { return one.event % interval != 0; });

@@ -84,6 +84,7 @@ private:
   std::uint32_t SiteOf(std::uint32_t stack);
   void KeepPeak();
   void AddSample();
+  void ThinSamples();
 
   Recording& recording;
   Symbols symbols;

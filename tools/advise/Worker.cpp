@@ -13,6 +13,7 @@
 #include <fcntl.h>
 #include <memory>
 #include <span>
+#include <stdexcept>
 #include <string>
 #include <sys/mman.h>
 #include <sys/stat.h>
@@ -24,9 +25,9 @@ namespace {
 using namespace VOK::MemPool;
 using namespace VOK::MemPool::Tools;
 
-[[noreturn]] void Fail(const char* what) {
-  std::fprintf(stderr, "vokmempool-replay: %s\n", what);
-  std::exit(1);
+[[noreturn]] void Fail(const char* what, int status = 1) {
+  std::fprintf(stderr, "%s\n", what); // vokmempool says who failed
+  std::exit(status);
 }
 
 struct Block {
@@ -250,6 +251,8 @@ int main(int argc, char** argv) {
                   static_cast<unsigned long long>(figures.bytes),
                   static_cast<unsigned long long>(figures.bytesHeld));
     }
+  } catch (const std::invalid_argument& error) {
+    Fail(error.what(), badSettings);
   } catch (const std::exception& error) {
     Fail(error.what());
   }

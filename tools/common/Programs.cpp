@@ -1,15 +1,19 @@
 #include "common/Programs.h"
 
-#include "common/Tool.h"
+#include "common/Files.h"
 
 #include <cerrno>
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <fcntl.h>
 #include <filesystem>
 #include <fmt/format.h>
+#include <fstream>
 #include <link.h>
 #include <set>
 #include <spawn.h>
+#include <sys/mman.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -24,13 +28,9 @@ std::string FindHelper(const std::string& name) {
   throw Failure(fmt::format("{} is missing beside this program", name));
 }
 
-std::string TemporaryName() {
-  const bool hasMemory = access("/dev/shm", W_OK) == 0;
-  return (hasMemory ? fs::path("/dev/shm") : fs::temp_directory_path()) / "vokmempool.XXXXXX";
-}
-
 TemporaryFolder::TemporaryFolder() {
-  path = TemporaryName();
+  const bool hasMemory = access("/dev/shm", W_OK) == 0;
+  path = (hasMemory ? fs::path("/dev/shm") : fs::temp_directory_path()) / "vokmempool.XXXXXX";
   if (mkdtemp(path.data()) == nullptr)
     throw Failure(fmt::format("{}: can't be made: {}", path, std::strerror(errno)));
 }
@@ -40,12 +40,35 @@ TemporaryFolder::~TemporaryFolder() {
   fs::remove_all(path, ignored);
 }
 
+HeldFile::HeldFile()
+    : handle(memfd_create("vokmempool", 0)), path(fmt::format("/proc/self/fd/{}", handle)) {
+  if (handle < 0)
+    throw Failure(fmt::format("no file can be made in memory: {}", std::strerror(errno)));
+}
+
+HeldFile::HeldFile(const std::string& source) : HeldFile() {
+  if (source != "-" && fs::is_regular_file(source)) {
+    const int file = open(source.c_str(), O_RDONLY | O_CLOEXEC);
+    if (file < 0 || dup2(file, handle) < 0) // in place of the memory
+      throw Failure(fmt::format("{}: can't be opened: {}", source, std::strerror(errno)));
+    close(file);
+    return;
+  }
+  Input input(source);
+  std::ofstream copy(path, std::ios::binary);
+  char part[65536];
+  for (std::size_t count; (count = input.Read(part, sizeof part)) > 0;)
+    copy.write(part, static_cast<std::streamsize>(count));
+  if (!copy.flush()) throw Failure(NameOfFile(source) + ": can't be copied to memory");
+}
+
+HeldFile::~HeldFile() { close(handle); }
+
 std::vector<std::string> Environment(std::string_view without) {
   std::vector<std::string> variables;
   for (char** variable = environ; *variable != nullptr; ++variable) {
     const std::string_view text = *variable;
-    if (text.starts_with("LD_PRELOAD=") || (!without.empty() && text.starts_with(without)))
-      continue;
+    if (text.starts_with("LD_PRELOAD=") || text.starts_with(without)) continue;
     variables.emplace_back(text);
   }
   return variables;
@@ -60,12 +83,31 @@ std::vector<char*> Pointers(std::vector<std::string>& texts) {
   return pointers;
 }
 
+int ShellStatus(int waited) {
+  return WIFSIGNALED(waited) ? 128 + WTERMSIG(waited) : WEXITSTATUS(waited);
+}
+
+namespace {
+
+/// Why a program failed: its last line on the error stream, else its status.
+std::string Explain(const std::string& path, std::string_view errors, int waited) {
+  while (errors.ends_with('\n'))
+    errors.remove_suffix(1);
+  if (!errors.empty()) return OneLine(errors.substr(errors.rfind('\n') + 1));
+  return WIFSIGNALED(waited) ? fmt::format("{}: ended by signal {}", path, WTERMSIG(waited))
+                             : fmt::format("{}: ended with status {}", path, WEXITSTATUS(waited));
+}
+
+} // namespace
+
 std::string RunProgram(const std::string& path, std::vector<std::string> arguments,
                        std::vector<std::string> variables) {
   int ends[2];
   if (pipe(ends) != 0) throw Failure(fmt::format("no pipe: {}", std::strerror(errno)));
+  const HeldFile errors;
   posix_spawn_file_actions_t actions;
   posix_spawn_file_actions_init(&actions);
+  posix_spawn_file_actions_adddup2(&actions, errors.GetHandle(), STDERR_FILENO);
   posix_spawn_file_actions_adddup2(&actions, ends[1], STDOUT_FILENO);
   posix_spawn_file_actions_addclose(&actions, ends[0]);
   posix_spawn_file_actions_addclose(&actions, ends[1]);
@@ -82,7 +124,9 @@ std::string RunProgram(const std::string& path, std::vector<std::string> argumen
   int status = 0;
   if (error == 0) waitpid(child, &status, 0);
   if (error != 0) throw Failure(fmt::format("{}: can't be run: {}", path, std::strerror(error)));
-  if (status != 0) throw Failure(fmt::format("{}: ended with status {}", path, status));
+  const std::string said = Input(errors.GetPath()).ReadAll();
+  if (status != 0) throw ProgramFailure(Explain(path, said, status), ShellStatus(status));
+  std::fwrite(said.data(), 1, said.size(), stderr);
   return output;
 }
 

@@ -60,10 +60,13 @@ Ring* Open() {
   const int file = open(path, O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600);
   if (file < 0) return nullptr;
   void* memory = MAP_FAILED;
-  if (ftruncate(file, sizeof(Ring)) == 0)
+  if (posix_fallocate(file, 0, sizeof(Ring)) == 0) // a hole could find no memory later: SIGBUS
     memory = mmap(nullptr, sizeof(Ring), PROT_READ | PROT_WRITE, MAP_SHARED, file, 0);
   close(file);
-  if (memory == MAP_FAILED) return nullptr;
+  if (memory == MAP_FAILED) {
+    unlink(path);
+    return nullptr;
+  }
   auto* const made = static_cast<Ring*>(memory); // a new file's zeros are its first state
   made->header.process = getpid();
   made->header.parent = getppid();

@@ -26,7 +26,11 @@ void AddRecord(CLI::App& app) {
   command->positionals_at_end();
   command->footer("Example: would pools help?\n"
                   "  vokmempool record -- ./program; vokmempool advise vokmempool.rec");
-  command->callback([request] { throw ExitStatus{RecordProgram(*request)}; });
+  command->callback([request] {
+    if (request->file == "-")
+      throw CLI::ValidationError("--output", "takes a file; standard output is the program's");
+    throw ExitStatus{RecordProgram(*request)};
+  });
 }
 
 } // namespace VOK::MemPool::Tools

@@ -97,6 +97,7 @@ bool Drain::Take() {
 }
 
 void Drain::End() {
+  ring->header.isAbandoned = 1; // of a process that goes on without the recorder
   const std::uint64_t end = std::min(ring->header.reserved.load(), at + ringSlots);
   while (at < end) {
     if (Take()) continue;

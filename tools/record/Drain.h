@@ -26,8 +26,8 @@ public:
   /// Writes what was published since the last call. False if that was nothing.
   bool Take();
 
-  /// Once the process is gone: writes what is left, and ends the recording. An event that its
-  /// thread didn't complete is lost.
+  /// Writes what is left, and ends the recording. An event that its thread didn't complete is lost;
+  /// a process that is still there goes on unrecorded.
   void End();
 
 private:

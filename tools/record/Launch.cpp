@@ -5,9 +5,8 @@
 #include "common/Tool.h"
 #include "record/Ring.h"
 
-#include <array>
+#include <algorithm>
 #include <cerrno>
-#include <csignal>
 #include <cstdlib>
 #include <cstring>
 #include <elf.h>
@@ -15,8 +14,11 @@
 #include <fmt/format.h>
 #include <fstream>
 #include <spawn.h>
+#include <sstream>
 #include <string_view>
+#include <sys/prctl.h>
 #include <sys/stat.h>
+#include <sys/wait.h>
 #include <sys/xattr.h>
 #include <unistd.h>
 
@@ -86,9 +88,37 @@ void CheckPreload(const std::string& path, int level = 0) {
         fmt::format("{}: is linked statically, so that no library can be preloaded", path));
 }
 
-volatile sig_atomic_t launched = 0;
+volatile sig_atomic_t running = 0; // the program
+volatile sig_atomic_t isEndAsked = 0;
 
-void PassOn(int signal) { kill(launched, signal); }
+void TakeSignal(int signal) {
+  if (running == 0)
+    isEndAsked = 1;
+  else if (signal == SIGTERM || signal == SIGHUP) // the terminal sends the others to both
+    kill(running, signal);
+}
+
+constexpr std::string_view library = "libvokmempool-record.so";
+
+/// The library's path as LD_PRELOAD can have it, which takes blanks and colons for ends.
+std::string PathToPreload(const std::string& folder) {
+  const std::string path = FindHelper(std::string(library));
+  if (path.find_first_of(" :") == std::string::npos) return path;
+  const fs::path link = fs::path(folder) / library;
+  fs::create_symlink(path, link);
+  return link;
+}
+
+/// What is preloaded, with the recorder's library first. In a recorder that is recorded itself
+/// there is one already, which would record the program a second time.
+std::string Preloads(const std::string& folder) {
+  std::string all = PathToPreload(folder);
+  const char* const variable = std::getenv("LD_PRELOAD");
+  std::istringstream others(variable != nullptr ? variable : "");
+  for (std::string other; std::getline(others, other, ':');)
+    if (!other.ends_with(library)) all += ":" + other;
+  return all;
+}
 
 } // namespace
 
@@ -98,26 +128,41 @@ std::string FindProgram(const std::string& command) {
   return path;
 }
 
-pid_t Launch(const std::string& program, std::vector<std::string> arguments,
-             const std::string& rings, unsigned depth) {
-  std::vector<std::string> variables = Environment();
-  const char* const before = std::getenv("LD_PRELOAD");
-  variables.push_back(fmt::format("LD_PRELOAD={}{}{}", FindHelper("libvokmempool-record.so"),
-                                  before != nullptr ? ":" : "", before != nullptr ? before : ""));
+Launch::Launch(const std::string& path, std::vector<std::string> arguments,
+               const std::string& rings, unsigned depth) {
+  std::vector<std::string> variables = Environment(Record::variables);
+  variables.push_back("LD_PRELOAD=" + Preloads(rings));
   variables.push_back(fmt::format("{}={}", Record::folderVariable, rings));
   variables.push_back(fmt::format("{}={} {}", Record::settingVariable, depth, getpid()));
 
-  std::signal(SIGCHLD, SIG_DFL); // an inherited SIG_IGN would hide the child's end
-  pid_t child = 0;
-  const int error = posix_spawn(&child, program.c_str(), nullptr, nullptr,
+  isEndAsked = 0;
+  handlers.back() = std::signal(SIGCHLD, SIG_DFL); // an inherited SIG_IGN would hide the end
+  prctl(PR_SET_CHILD_SUBREAPER, 1); // the recorder waits for what outlives its parent, too
+  const int error = posix_spawn(&program, path.c_str(), nullptr, nullptr,
                                 Pointers(arguments).data(), Pointers(variables).data());
-  if (error != 0) throw Failure(fmt::format("{}: can't be run: {}", program, std::strerror(error)));
-  launched = child;
-  std::signal(SIGINT, SIG_IGN);
-  std::signal(SIGQUIT, SIG_IGN);
-  std::signal(SIGTERM, PassOn);
-  std::signal(SIGHUP, PassOn);
-  return child;
+  if (error != 0) throw Failure(fmt::format("{}: can't be run: {}", path, std::strerror(error)));
+  running = program;
+  for (std::size_t i = 0; signals[i] != SIGCHLD; ++i)
+    handlers[i] = std::signal(signals[i], TakeSignal);
 }
+
+Launch::~Launch() {
+  for (std::size_t i = 0; i < signals.size(); ++i)
+    std::signal(signals[i], handlers[i]);
+  prctl(PR_SET_CHILD_SUBREAPER, 0);
+}
+
+bool Launch::IsRunning() {
+  int waited = 0;
+  pid_t ended = 0;
+  while ((ended = waitpid(-1, &waited, WNOHANG)) > 0)
+    if (ended == program) {
+      running = 0;
+      status = ShellStatus(waited);
+    }
+  return ended == 0;
+}
+
+bool Launch::IsEndAsked() { return isEndAsked != 0; }
 
 } // namespace VOK::MemPool::Tools

@@ -80,8 +80,10 @@ class Section {
 public:
   Section() : isOuter(isReady && !isInside) {
     if (!isOuter) return;
+    const int saved = errno;
     isInside = true;
     isRecording = Channel::IsOpen();
+    errno = saved;
   }
   ~Section() {
     if (isOuter) isInside = false;
@@ -98,16 +100,24 @@ private:
 };
 thread_local bool Section::isInside = false;
 
+/// The program's errno is the allocator's.
+void Put(const Event& event) {
+  const int saved = errno;
+  Channel::Put(event);
+  errno = saved;
+}
+
 /// A block that the caller of `frame` got.
 void PutBlock(void* const* frame, Kind kind, const void* block, std::size_t size,
               std::size_t alignment = 1) {
   const int saved = errno;
-  Channel::Put({.kind = kind,
-                .alignmentLog = static_cast<std::uint8_t>(std::bit_width(alignment | 1) - 1),
-                .stack = Stack::GetNumber(frame),
-                .address = reinterpret_cast<std::uintptr_t>(block),
-                .size = size});
+  const std::uint32_t stack = Stack::GetNumber(frame);
   errno = saved;
+  Put({.kind = kind,
+       .alignmentLog = static_cast<std::uint8_t>(std::bit_width(alignment | 1) - 1),
+       .stack = stack,
+       .address = reinterpret_cast<std::uintptr_t>(block),
+       .size = size});
 }
 
 void** FrameOf(void* address) { return static_cast<void**>(address); }
@@ -143,24 +153,20 @@ VOK_INTERPOSE void* realloc(void* block, std::size_t size) {
   }
   const Section section;
   if (section && block != nullptr)
-    Channel::Put({.kind = Kind::ReallocBegin, .address = reinterpret_cast<std::uintptr_t>(block)});
+    Put({.kind = Kind::ReallocBegin, .address = reinterpret_cast<std::uintptr_t>(block)});
   void* const moved = next.realloc(block, size);
   if (!section) return moved;
   if (moved != nullptr)
     PutBlock(VOK_FRAME, block == nullptr ? Kind::Malloc : Kind::Realloc, moved, size);
   else if (block != nullptr)
-    Channel::Put({.kind = Kind::ReallocEnd, .size = size});
+    Put({.kind = Kind::ReallocEnd, .size = size});
   return moved;
 }
 
 VOK_INTERPOSE void free(void* block) {
   if (block == nullptr || !HasNext() || IsEarly(block)) return;
   const Section section;
-  if (section) {
-    const int saved = errno;
-    Channel::Put({.kind = Kind::Free, .address = reinterpret_cast<std::uintptr_t>(block)});
-    errno = saved;
-  }
+  if (section) Put({.kind = Kind::Free, .address = reinterpret_cast<std::uintptr_t>(block)});
   next.free(block);
 }
 

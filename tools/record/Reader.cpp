@@ -46,6 +46,7 @@ bool Recording::Next(RecordedEvent& event) {
       }
     if (!hasEnded && !ReadBlock()) isCut = hasEnded = true;
   }
+  source = nullptr; // and with it the progress that it shows
   return false;
 }
 
@@ -129,7 +130,8 @@ void Recording::TakeInformation(Entry kind) {
     return;
   case Entry::Module: {
     const std::uint64_t address = TakeNumber();
-    loading.push_back({address, TakeText()});
+    auto& list = isLoading ? loading : modules.back(); // another thread's stack may come between
+    list.push_back({address, TakeText()});
     return;
   }
   case Entry::Stack:
@@ -198,10 +200,10 @@ void Recording::EndModules() {
   loading.clear();
 }
 
-Recording OpenRecording(const std::string& path) {
+Recording OpenRecording(const std::string& path, const std::string& name) {
   const auto input = std::make_shared<Input>(path);
   const auto progress = std::make_shared<Progress>(input->GetSize());
-  return {NameOfFile(path), [=](char* to, std::size_t size) {
+  return {name, [=](char* to, std::size_t size) {
             const std::size_t read = input->Read(to, size);
             progress->Add(read);
             return read;

@@ -69,7 +69,7 @@ private:
   void EndModules();
 
   const std::string name;
-  const Source source;
+  Source source;
   std::string stored, block;
   std::size_t at = 0; ///< in the block
   bool hasEnded = false;
@@ -79,8 +79,8 @@ private:
   bool isLoading = false;
 };
 
-/// The recording in a file, or on standard input under the name "-".
-Recording OpenRecording(const std::string& path);
+/// The recording in a file; `name` is for messages.
+Recording OpenRecording(const std::string& path, const std::string& name);
 
 } // namespace VOK::MemPool::Tools
 

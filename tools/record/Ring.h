@@ -78,7 +78,8 @@ struct Ring {
   Slot slots[ringSlots];
 };
 
-/// Names of the environment variables by which the recorder speaks to the library.
+/// Names of the environment variables by which the recorder speaks to the library, and their start.
+constexpr const char* variables = "VOK_MEMPOOL_RECORD_";
 constexpr const char* folderVariable = "VOK_MEMPOOL_RECORD_FOLDER";   ///< where the rings are made
 constexpr const char* settingVariable = "VOK_MEMPOOL_RECORD_SETTING"; ///< "DEPTH PID", decimal: how
                                                                       ///< deep; the recorder's

@@ -7,15 +7,13 @@
 #include "record/Launch.h"
 
 #include <algorithm>
+#include <cerrno>
 #include <chrono>
+#include <csignal>
 #include <filesystem>
 #include <fmt/format.h>
 #include <memory>
-#include <poll.h>
-#include <sys/syscall.h>
-#include <sys/wait.h>
 #include <thread>
-#include <unistd.h>
 
 namespace VOK::MemPool::Tools {
 
@@ -24,13 +22,9 @@ namespace {
 /// A process that has a ring.
 struct Recorded {
   std::unique_ptr<Drain> drain;
-  int handle;          ///< readable once the process is gone; -1 if it was before
   bool isOver = false; ///< another program runs in the process
 
-  bool HasEnded() const {
-    pollfd state{handle, POLLIN, 0};
-    return isOver || handle < 0 || poll(&state, 1, 0) > 0;
-  }
+  bool HasEnded() const { return isOver || (kill(drain->GetProcess(), 0) != 0 && errno == ESRCH); }
 };
 
 /// The processes of a recording, and their files.
@@ -40,9 +34,9 @@ public:
       : request(request_), folder(folder_) {}
 
   /// One round; whether any process had something to write. New processes are looked for now and
-  /// then, or at once.
-  bool Take(bool looks) {
-    if (looks || std::chrono::steady_clock::now() >= nextLook) Find();
+  /// then.
+  bool Take() {
+    if (std::chrono::steady_clock::now() >= nextLook) Find();
     bool any = false;
     for (Recorded& one : recorded) {
       const bool hasEnded = one.HasEnded(); // so that nothing comes after what is taken now
@@ -53,15 +47,23 @@ public:
     return any;
   }
 
-  bool IsDone() const { return recorded.empty(); }
+  void End() {
+    Find();
+    for (Recorded& one : recorded)
+      End(one);
+    recorded.clear();
+  }
 
   void Say() const {
-    if (numFiles == 0) throw Failure("nothing was recorded: the program made no request");
+    if (numFiles == 0)
+      throw Failure("nothing was recorded: the loader ignored the recorder's library, or there was "
+                    "no memory for its ring in " +
+                    folder);
     std::string files = request.isKept ? " in " + request.file : "";
     if (request.isKept && numFiles > 1) files += " to " + PathOf(numFiles);
     fmt::print(stderr, "vokmempool: {} event{} of {} process{}{}\n", numEvents,
                numEvents == 1 ? "" : "s", numFiles, numFiles == 1 ? "" : "es", files);
-    if (numLost > 0) fmt::print(stderr, "vokmempool: {} events were lost\n", numLost);
+    if (numLost > 0) fmt::print(stderr, "vokmempool: at least {} events were lost\n", numLost);
   }
 
 private:
@@ -81,7 +83,7 @@ private:
       const int process = drain->GetProcess();
       for (Recorded& earlier : recorded)
         earlier.isOver |= earlier.drain->GetProcess() == process;
-      recorded.push_back({std::move(drain), static_cast<int>(syscall(SYS_pidfd_open, process, 0))});
+      recorded.push_back({std::move(drain)});
     }
   }
 
@@ -90,7 +92,6 @@ private:
     numEvents += one.drain->GetNumEvents();
     numLost += one.drain->GetNumLost();
     one.drain = nullptr;
-    if (one.handle >= 0) close(one.handle);
   }
 
   const RecordRequest& request;
@@ -101,6 +102,15 @@ private:
   std::uint64_t numEvents = 0, numLost = 0;
 };
 
+/// Runs the program to the end of all its processes, or of the recorder, and returns its status.
+int Run(const std::string& program, const RecordRequest& request, const std::string& folder,
+        Session& session) {
+  Launch processes(program, request.program, folder, request.depth);
+  while (processes.IsRunning() && !Launch::IsEndAsked())
+    if (!session.Take()) std::this_thread::sleep_for(std::chrono::microseconds(500));
+  return processes.GetStatus();
+}
+
 } // namespace
 
 int RecordProgram(const RecordRequest& request) {
@@ -108,18 +118,10 @@ int RecordProgram(const RecordRequest& request) {
   WriteFile(request.file, {}); // fails before the program starts
   const TemporaryFolder folder;
   Session session(request, folder.GetPath());
-  const pid_t child = Launch(program, request.program, folder.GetPath(), request.depth);
-  int status = 0;
-  bool isRunning = true;
-  for (;;) {
-    if (isRunning && waitpid(child, &status, WNOHANG) == child) isRunning = false;
-    const bool wasRunning = isRunning;
-    const bool any = session.Take(!wasRunning);
-    if (!wasRunning && session.IsDone()) break;
-    if (!any) std::this_thread::sleep_for(std::chrono::microseconds(500));
-  }
+  const int status = Run(program, request, folder.GetPath(), session);
+  session.End();
   session.Say();
-  return WIFSIGNALED(status) ? 128 + WTERMSIG(status) : WEXITSTATUS(status);
+  return status;
 }
 
 } // namespace VOK::MemPool::Tools

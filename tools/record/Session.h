@@ -16,7 +16,8 @@ struct RecordRequest {
 };
 
 /// Returns once all processes of the program have ended, with its status as a shell has it: that of
-/// a signal is 128 more. Says on the error stream what was recorded. Fails if the program can't be
+/// a signal is 128 more. What asks it to end is passed on to the program; once that has ended, it
+/// ends the recording. Says on the error stream what was recorded. Fails if the program can't be
 /// recorded, before it starts.
 int RecordProgram(const RecordRequest& request);
 
